@@ -1,0 +1,58 @@
+// The command line program's global behaviour: options, exit statuses and
+// the two forms of printed messages.
+#include <gtest/gtest.h>
+#include <nlohmann/json.hpp>
+
+#include <sstream>
+
+#include "support/RunProcess.h"
+
+namespace faultbox {
+namespace {
+
+using test::RunFaultbox;
+
+TEST(CliTest, HelpVersionAndBadUsage) {
+  auto help = RunFaultbox({"--help"});
+  EXPECT_EQ(help.exitCode, 0);
+  EXPECT_NE(help.out.find("--messages"), std::string::npos);
+  auto version = RunFaultbox({"--version"});
+  EXPECT_EQ(version.exitCode, 0);
+  EXPECT_NE(version.out.find("faultbox "), std::string::npos);
+  EXPECT_EQ(RunFaultbox({"--no-such-option"}).exitCode, 2);
+  EXPECT_EQ(RunFaultbox({}).exitCode, 2);
+  EXPECT_EQ(RunFaultbox({"--messages=xml", "messages", "35"}).exitCode, 2);
+}
+
+TEST(CliTest, MessagesInTextForm) {
+  auto ok = RunFaultbox({"messages", "47"});
+  EXPECT_EQ(ok.exitCode, 0);
+  EXPECT_NE(ok.out.find("47"), std::string::npos);
+  EXPECT_TRUE(ok.err.empty());
+
+  auto bad = RunFaultbox({"messages", "7"});
+  EXPECT_EQ(bad.exitCode, 1);
+  EXPECT_EQ(bad.err.rfind("error 902: ", 0), 0u) << bad.err;
+}
+
+TEST(CliTest, MessagesInJsonFormAreOneObjectPerLine) {
+  auto r = RunFaultbox({"--messages=json", "messages", "7", "8"});
+  EXPECT_EQ(r.exitCode, 1);
+  std::istringstream lines(r.err);
+  std::string line;
+  int count = 0;
+  while (std::getline(lines, line)) {
+    auto j = nlohmann::json::parse(line);
+    EXPECT_EQ(j["number"], 902);
+    EXPECT_EQ(j["class"], 3);
+    ASSERT_EQ(j["texts"].size(), 2u);
+    EXPECT_EQ(j["texts"][0], count == 0 ? "7" : "8");
+    EXPECT_TRUE(j["show"].is_boolean());
+    EXPECT_NE(j["text"].get<std::string>().find(count == 0 ? "7" : "8"), std::string::npos);
+    ++count;
+  }
+  EXPECT_EQ(count, 2);
+}
+
+}  // namespace
+}  // namespace faultbox
