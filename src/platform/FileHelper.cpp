@@ -2,6 +2,8 @@
 // questions the documents ask (existence, write protection).
 #include "platform/FileHelper.h"
 
+#include "platform/Text.h"
+
 #include <fcntl.h>
 #include <sys/stat.h>
 #include <sys/statvfs.h>
@@ -17,10 +19,6 @@ namespace {
 
 bool IsSeparator(char c) {
   return c == '/' || c == '\\';
-}
-
-char AsciiUpper(char c) {
-  return (c >= 'a' && c <= 'z') ? static_cast<char>(c - 'a' + 'A') : c;
 }
 
 // "C:..." after folding: a Windows drive path that names nothing on this machine.

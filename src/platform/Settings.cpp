@@ -2,6 +2,8 @@
 // write changes only the one line it must, and atomic replacement of the file.
 #include "platform/Settings.h"
 
+#include "platform/Text.h"
+
 #include "platform/AtomicFile.h"
 
 #include <fcntl.h>
@@ -37,22 +39,12 @@ std::string_view Trim(std::string_view s) {
   return s;
 }
 
-char AsciiLower(char c) {
-  return (c >= 'A' && c <= 'Z') ? static_cast<char>(c - 'A' + 'a') : c;
-}
-
-bool EqualNoCase(std::string_view a, std::string_view b) {
-  if (a.size() != b.size()) return false;
-  for (size_t i = 0; i < a.size(); ++i)
-    if (AsciiLower(a[i]) != AsciiLower(b[i])) return false;
-  return true;
-}
 
 // "A" matches "A" and every section below it ("A\B", "A\B\C"), as deleting a registry key does.
 bool IsSameOrBelow(std::string_view name, std::string_view section) {
-  if (EqualNoCase(name, section)) return true;
+  if (EqualsNoCase(name, section)) return true;
   return name.size() > section.size() && name[section.size()] == '\\' &&
-         EqualNoCase(name.substr(0, section.size()), section);
+         EqualsNoCase(name.substr(0, section.size()), section);
 }
 
 struct Line {
@@ -158,7 +150,7 @@ void ForEachEntry(const IniFile& file, std::string_view section, Visit visit) {
   for (size_t i = 0; i < file.lines.size(); ++i) {
     const Line& line = file.lines[i];
     if (line.kind == Line::Header)
-      inside = EqualNoCase(line.name, section);
+      inside = EqualsNoCase(line.name, section);
     else if (inside && line.kind == Line::Entry)
       visit(line, i);
   }
@@ -287,7 +279,7 @@ std::optional<std::string> Settings::GetString(const std::string& section, const
   if (Load(Path(), file) != LoadResult::Ok) return std::nullopt;
   std::optional<std::string> result;
   ForEachEntry(file, section, [&](const Line& line, size_t) {
-    if (!result && EqualNoCase(line.name, key)) result = line.value;
+    if (!result && EqualsNoCase(line.name, key)) result = line.value;
   });
   return result;
 }
@@ -298,7 +290,7 @@ std::vector<std::pair<std::string, std::string>> Settings::GetSection(const std:
   if (Load(Path(), file) != LoadResult::Ok) return result;
   ForEachEntry(file, section, [&](const Line& line, size_t) {
     for (const auto& [name, value] : result)
-      if (EqualNoCase(name, line.name)) return;  // the first of repeated keys is the one in force
+      if (EqualsNoCase(name, line.name)) return;  // the first of repeated keys is the one in force
     result.emplace_back(line.name, line.value);
   });
   return result;
@@ -318,7 +310,7 @@ bool Settings::SetString(const std::string& section, const std::string& key, con
 
   std::optional<size_t> existing;
   ForEachEntry(file, section, [&](const Line& line, size_t index) {
-    if (!existing && EqualNoCase(line.name, key)) existing = index;
+    if (!existing && EqualsNoCase(line.name, key)) existing = index;
   });
   if (existing) {
     Line& line = file.lines[*existing];
@@ -332,7 +324,7 @@ bool Settings::SetString(const std::string& section, const std::string& key, con
   Line entry = ParseLine(key + "=" + value, false);
   std::optional<size_t> header;
   for (size_t i = 0; i < file.lines.size() && !header; ++i)
-    if (file.lines[i].kind == Line::Header && EqualNoCase(file.lines[i].name, section)) header = i;
+    if (file.lines[i].kind == Line::Header && EqualsNoCase(file.lines[i].name, section)) header = i;
   if (header) {
     // After the section's last entry, so that comments that introduce the next section stay with it.
     size_t insertAt = *header + 1;
