@@ -21,9 +21,11 @@ struct Context {
 using Registrar = void (*)(CLI::App& app, Context& ctx);
 
 void RegisterMessageCommands(CLI::App& app, Context& ctx);
+void RegisterFcdCommands(CLI::App& app, Context& ctx);
 
 // Front-end message numbers (outside the component's own range).
 constexpr int kMsgCannotReadFile = 901;
 constexpr int kMsgUnknownMessage = 902;
+constexpr int kMsgCannotWriteFile = 912;
 
 }  // namespace faultbox::cli

@@ -179,6 +179,9 @@ constexpr Entry kMessages[] = {
     // Front ends' own messages.
     {901, "Cannot read the file %1: %2"},
     {902, "There is no message number %1."},
+    {910, "The failure class source %1 is not valid JSON: %2"},
+    {911, "Failure class source %1: %2"},
+    {912, "The file %1 cannot be written: %2"},
 };
 
 // Numbers 6701 and 6752 are document type descriptions: newline-separated

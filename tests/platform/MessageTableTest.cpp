@@ -21,7 +21,7 @@ const std::vector<int> kRaisedMessages = {
     136, 140, 142, 143, 144, 145, 146, 147, 148, 149, 150, 151, 152, 153, 154, 155, 156, 157, 158, 161,
     162, 164, 165, 166, 167, 168, 169, 170, 171, 172, 173, 174, 175, 176, 177, 178, 179, 183,
     // the front ends' own
-    901, 902};
+    901, 902, 910, 911, 912};
 
 // Every resource string the component loads by number.
 const std::vector<int> kUsedStrings = {6701, 6704, 6706, 6707, 6709, 6711, 6712, 6713, 6714, 6715, 6717, 6719,
