@@ -21,6 +21,7 @@ struct Context {
 using Registrar = void (*)(CLI::App& app, Context& ctx);
 
 void RegisterMessageCommands(CLI::App& app, Context& ctx);
+void RegisterPinfileCommands(CLI::App& app, Context& ctx);
 void RegisterFcdCommands(CLI::App& app, Context& ctx);
 
 // Front-end message numbers (outside the component's own range).

@@ -50,6 +50,7 @@ class JsonSink : public MessageSink {
 
 constexpr Registrar kRegistrars[] = {
     RegisterMessageCommands,
+    RegisterPinfileCommands,
     RegisterFcdCommands,
 };
 
