@@ -23,6 +23,7 @@ using Registrar = void (*)(CLI::App& app, Context& ctx);
 void RegisterMessageCommands(CLI::App& app, Context& ctx);
 void RegisterPinfileCommands(CLI::App& app, Context& ctx);
 void RegisterFcdCommands(CLI::App& app, Context& ctx);
+void RegisterSystemCommands(CLI::App& app, Context& ctx);
 
 // Front-end message numbers (outside the component's own range).
 constexpr int kMsgCannotReadFile = 901;

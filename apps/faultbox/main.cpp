@@ -52,6 +52,7 @@ constexpr Registrar kRegistrars[] = {
     RegisterMessageCommands,
     RegisterPinfileCommands,
     RegisterFcdCommands,
+    RegisterSystemCommands,
 };
 
 }  // namespace

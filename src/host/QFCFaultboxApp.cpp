@@ -1,6 +1,8 @@
 // The reporting operations of the application object.
 #include "host/QFCFaultboxApp.h"
 
+#include "platform/Settings.h"
+
 namespace faultbox {
 
 QFCFaultboxApp& TheApp() {
@@ -52,6 +54,15 @@ HRESULT QFCFaultboxApp::ShowReported(int handle, bool show) {
 
 HRESULT QFCFaultboxApp::ReportInternalFault(int place) {
   return ShowReported(ReportInternal(kInternalFault, std::to_string(place)), true);
+}
+
+int QFCFaultboxApp::GetUserMode() {
+  int mode = userMode_.load();
+  if (mode >= 0) return mode;
+  const std::optional<std::string> value = Settings::GetString(Settings::kComponentSection, "UserMode");
+  mode = !value ? 0 : (*value == kServiceModeCode ? 2 : 1);
+  userMode_.store(mode);
+  return mode;
 }
 
 }  // namespace faultbox

@@ -1,0 +1,119 @@
+// A failure simulation system: one failure insertion hardware as its pin
+// files describe it, with its platform, ECUs, failure classes and transfer
+// interface.
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "systems/QFCSystemProperty.h"
+
+namespace faultbox {
+
+class QFCAbstractFailureClasses;
+class QFCAbstractHardwareInfo;
+class QFCECU;
+
+class QFCSystem : public QFCSystemProperty {
+ public:
+  // What changed when the views are told.
+  enum UpdateHint : int {
+    kUpdateAll = 0,
+    kUpdateName = 1,
+    kUpdateConnection = 2,
+    kUpdateReset = 3,
+    kUpdateProperties = 4,
+  };
+
+  // Only the system administration makes systems, and opens them at once.
+  QFCSystem(std::string name, const std::string& pinFilePath, std::int32_t ecuVersion, std::string author,
+            std::string description);
+  ~QFCSystem() override;
+
+  // Reads the pin file, the additional pin files it names, the platform's
+  // configuration and failure classes, collects the ECUs and creates the
+  // transfer interface. A failure leaves a half-built system that the caller
+  // deletes.
+  HRESULT OpenFromPinFile();
+
+  // "FIULoadAddress", "RSIMLoadAddress" or "OffsetLoadAddress" of the pin
+  // file as a number. A module that is not fitted ("none", "-", "#"), a value
+  // that cannot be read and any other key fail with message 37 and
+  // E_FAULTBOX_INVALID_PARAMETER.
+  HRESULT GetLoadAddress(const std::string& key, std::uint32_t& address) const;
+
+  // The ECUs of all pin files, in pin file order. GetECU gives nullptr and an
+  // internal fault for an index outside 0 ... count-1.
+  int GetECUCount() const { return static_cast<int>(ecus_.size()); }
+  QFCECU* GetECU(int index) const;
+  const std::vector<QFCECU*>& GetECUs() const { return ecus_; }
+
+  // Author, ECU version, connection, description, pin file and user mode,
+  // each under its label.
+  void GetProperties(PropertyTable& table) const override;
+
+  // The system's part of the document: the property part, then the names of
+  // the disabled ECUs.
+  void Serialize(Archive& ar) override;
+
+  // ---- questions of the owner chain ----
+  // True when the document file that holds the system is write-protected; a
+  // system that no saved document holds is writable.
+  bool IsReadOnly() const override;
+  bool IsPatternActivated() const override { return false; }
+  // Marks the document modified; ignored while read-only.
+  void SetModified() override;
+  bool IsModified() const { return modified_; }
+  void ClearModified() { modified_ = false; }
+
+  // The path of the document file that holds the system ("" until saved or loaded).
+  const std::string& GetDocumentPath() const { return documentPath_; }
+  void SetDocumentPath(std::string path) { documentPath_ = std::move(path); }
+
+  // ---- properties ----
+  // The caller keeps names unique (the administration's Rename does).
+  void SetName(std::string name);
+  // Refused with message 118 (false) on a read-only system.
+  bool SetAuthor(std::string author);
+  bool SetDescription(std::string description);
+  bool SetECUVersion(std::int32_t ecuVersion);
+
+  // Tells the views of the system about a change.
+  void UpdateViews(int hint = kUpdateAll);
+
+  // The hardware descriptions: the pin file's first, then one per additional pin file.
+  const std::vector<std::unique_ptr<QFCAbstractHardwareInfo>>& GetHardwareInfos() const {
+    return hardwareInfos_;
+  }
+  // The failure classes read at open, or nullptr.
+  QFCAbstractFailureClasses* GetFailureClasses() const { return failureClasses_.get(); }
+  // The failure class file as it was opened (relative names resolved, the
+  // default file completed), "" before the open reached it.
+  const std::string& GetFailureClassPathUsed() const { return failureClassPathUsed_; }
+
+ private:
+  // A hardware description of the platform that the file's board type gives;
+  // `platform` receives that platform. nullptr with `result` set when the
+  // board type cannot be read or names no platform.
+  std::unique_ptr<QFCAbstractHardwareInfo> CreateHardwareInfo(const std::string& path, std::int32_t& platform,
+                                                              HRESULT& result);
+  HRESULT ReadPlatformConfiguration(const QFCAbstractHardwareInfo& info);
+  HRESULT ReadKR40Configuration(const QFCAbstractHardwareInfo& info);
+  HRESULT ReadKR60Configuration(const QFCAbstractHardwareInfo& info);
+  HRESULT LoadSystemFailureClasses();
+  // Adds the description's columns to the visible pin properties, keeping the flags of known ones.
+  void RegisterColumns(const QFCAbstractHardwareInfo& info);
+  bool CheckWritable() const;
+  void DisconnectSilently();
+
+  std::vector<std::unique_ptr<QFCAbstractHardwareInfo>> hardwareInfos_;
+  std::vector<QFCECU*> ecus_;  // owned by the hardware descriptions
+  std::unique_ptr<QFCAbstractFailureClasses> failureClasses_;
+  std::string failureClassPathUsed_;
+  std::string documentPath_;
+  bool modified_ = false;
+};
+
+}  // namespace faultbox

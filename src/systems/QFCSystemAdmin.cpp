@@ -1,0 +1,125 @@
+// Names, lookup and removal of the open systems.
+#include "systems/QFCSystemAdmin.h"
+
+#include "config/QFCFSHelper.h"
+#include "host/QFCFaultboxApp.h"
+#include "platform/MessageTable.h"
+#include "systems/QFCSystem.h"
+
+namespace faultbox {
+
+namespace {
+
+constexpr int kMsgNameUsed = 88;
+constexpr int kMsgSystemClosed = 117;
+constexpr int kDefaultNameFormat = 6799;
+
+constexpr int kPlaceRenameInvalid = 5201;
+constexpr int kPlaceSameHilInvalid = 5202;
+
+// The resource format with its one integer placeholder filled in. Formatted
+// by hand: the format comes from a table, never from printf's format argument.
+std::string FormatDefaultName(int number) {
+  const char* format = ResourceString(kDefaultNameFormat);
+  std::string text = format ? format : "System %d";
+  for (const char* placeholder : {"%d", "%i"}) {
+    if (std::size_t at = text.find(placeholder); at != std::string::npos)
+      return text.replace(at, 2, std::to_string(number));
+  }
+  return text + " " + std::to_string(number);
+}
+
+}  // namespace
+
+QFCSystemAdmin::QFCSystemAdmin() = default;
+
+QFCSystemAdmin::~QFCSystemAdmin() = default;
+
+std::string QFCSystemAdmin::GetDefaultName() const {
+  // Among count + 1 numbers one is always free.
+  const int last = GetCount() + 1;
+  for (int number = 1; number < last; ++number) {
+    std::string name = FormatDefaultName(number);
+    if (!IsNameUsed(name)) return name;
+  }
+  return FormatDefaultName(last);
+}
+
+HRESULT QFCSystemAdmin::Open(const std::string& pinFile, std::int32_t ecuVersion, const std::string& author,
+                             const std::string& description, QFCSystem*& system) {
+  system = nullptr;
+  auto created = std::make_unique<QFCSystem>(GetDefaultName(), pinFile, ecuVersion, author, description);
+  if (HRESULT result = created->OpenFromPinFile(); result != FAULTBOX_OK) return result;
+  system = created.get();
+  systems_.push_back(std::move(created));
+  system->UpdateViews();
+  return FAULTBOX_OK;
+}
+
+QFCSystem* QFCSystemAdmin::FindByName(std::string_view name) const {
+  for (const auto& system : systems_)
+    if (QFCFSHelper::EqualNoCase(system->GetName(), name)) return system.get();
+  return nullptr;
+}
+
+bool QFCSystemAdmin::IsNameUsed(std::string_view name, const QFCSystem* ignore) const {
+  for (const auto& system : systems_)
+    if (system.get() != ignore && QFCFSHelper::EqualNoCase(system->GetName(), name)) return true;
+  return false;
+}
+
+QFCSystem* QFCSystemAdmin::GetAt(int index) const {
+  if (index < 0 || index >= GetCount()) return nullptr;
+  return systems_[static_cast<std::size_t>(index)].get();
+}
+
+void QFCSystemAdmin::Remove(const std::string& name) {
+  for (auto it = systems_.begin(); it != systems_.end(); ++it) {
+    if (!QFCFSHelper::EqualNoCase((*it)->GetName(), name)) continue;
+    TheApp().ReportInfo(kMsgSystemClosed, (*it)->GetName());
+    // Destroying the system disconnects it without reports.
+    systems_.erase(it);
+    return;
+  }
+}
+
+bool QFCSystemAdmin::Rename(QFCSystem* system, const std::string& newName) {
+  if (system == nullptr) {
+    TheApp().ReportInternalFault(kPlaceRenameInvalid);
+    return false;
+  }
+  if (IsNameUsed(newName, system)) {
+    TheApp().ReportError(kMsgNameUsed, newName);
+    return false;
+  }
+  system->SetName(newName);
+  return true;
+}
+
+QFCSystem* QFCSystemAdmin::FindOtherSystemOnSameHil(const QFCSystem* system) const {
+  if (system == nullptr) {
+    TheApp().ReportInternalFault(kPlaceSameHilInvalid);
+    return nullptr;
+  }
+  if (system->GetPlatformType() == 1) return nullptr;
+  bool ownRead = false;
+  std::uint32_t own = 0;
+  for (const auto& other : systems_) {
+    if (other.get() == system || !other->IsConnected()) continue;
+    if (!ownRead) {
+      if (Failed(system->GetLoadAddress("FIULoadAddress", own))) own = 0;
+      ownRead = true;
+    }
+    std::uint32_t theirs = 0;
+    if (Failed(other->GetLoadAddress("FIULoadAddress", theirs))) theirs = 0;
+    if (own == theirs && other->GetPlatformType() == system->GetPlatformType()) return other.get();
+  }
+  return nullptr;
+}
+
+void QFCSystemAdmin::GetConnectedSystems(std::vector<QFCSystem*>& systems) const {
+  for (const auto& system : systems_)
+    if (system->IsConnected()) systems.push_back(system.get());
+}
+
+}  // namespace faultbox

@@ -1,0 +1,57 @@
+// The administration of every open failure simulation system: it creates,
+// names, renames and removes them, and answers questions about the set.
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "host/ResultCodes.h"
+
+namespace faultbox {
+
+class QFCSystem;
+
+class QFCSystemAdmin {
+ public:
+  QFCSystemAdmin();
+  ~QFCSystemAdmin();
+  QFCSystemAdmin(const QFCSystemAdmin&) = delete;
+  QFCSystemAdmin& operator=(const QFCSystemAdmin&) = delete;
+
+  // Creates a system under the first free default name, opens it from the pin
+  // file and keeps it. On failure the system is deleted, `system` is nullptr
+  // and the administration is unchanged.
+  HRESULT Open(const std::string& pinFile, std::int32_t ecuVersion, const std::string& author,
+               const std::string& description, QFCSystem*& system);
+  // The first default name ("System 1", "System 2", ...) that no system bears.
+  std::string GetDefaultName() const;
+
+  // The first system whose name equals `name` without regard to case, or nullptr.
+  QFCSystem* FindByName(std::string_view name) const;
+  // True when a system other than `ignore` bears the name.
+  bool IsNameUsed(std::string_view name, const QFCSystem* ignore = nullptr) const;
+  int GetCount() const { return static_cast<int>(systems_.size()); }
+  // nullptr outside 0 ... count-1.
+  QFCSystem* GetAt(int index) const;
+
+  // Deletes the system of that name (message 117); the others keep their order.
+  void Remove(const std::string& name);
+  // Refused with message 88 when another system bears the new name; a change
+  // of case of a system's own name is allowed.
+  bool Rename(QFCSystem* system, const std::string& newName);
+
+  // Another connected system that drives the same KR60 HIL simulator (equal
+  // FIU load address, an unreadable one counting as 0), or nullptr. KR40-family
+  // systems never share a simulator.
+  QFCSystem* FindOtherSystemOnSameHil(const QFCSystem* system) const;
+  // Appends every connected system, in the order of creation.
+  void GetConnectedSystems(std::vector<QFCSystem*>& systems) const;
+
+ private:
+  std::vector<std::unique_ptr<QFCSystem>> systems_;
+};
+
+}  // namespace faultbox

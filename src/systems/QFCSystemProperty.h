@@ -1,0 +1,169 @@
+// The descriptive properties of a failure simulation system and the settings
+// with which its transfer interface reaches the hardware: the serial port of
+// the KR40 family, the CAN channel and bus timing of KR60.
+#pragma once
+
+#include <array>
+#include <cstddef>
+#include <cstdint>
+#include <map>
+#include <memory>
+#include <set>
+#include <string>
+#include <type_traits>
+#include <vector>
+
+#include "config/QFCAbstractObjectData.h"
+#include "host/ResultCodes.h"
+
+namespace faultbox {
+
+class Archive;
+class QFCAbstractTransferInterface;
+
+// Device types of the interface settings (the automation enumeration FSDeviceType).
+enum FSDeviceType : std::int32_t {
+  fdtCAN_IF_VI_CAN_CARD_X = 1,
+  fdtCAN_IF_LINKBOX_USB = 4,
+  fdtRS232_IF_PORT = 200,
+};
+
+// The serial port of a KR40-family system.
+struct QFTSerialInterfaceSettings {
+  std::string portName = "COM1";
+  std::uint32_t deviceType = fdtRS232_IF_PORT;
+  std::uint32_t portNumber = 1;
+};
+
+// The CAN channel of a KR60 system, laid out as one channel description of the
+// CAN access layer, so that the record is handed to it and taken from it
+// unchanged. Only the device type, the two interface parameters and the three
+// further values are ours; the rest belongs to the access layer.
+struct QFTCANInterfaceSettings {
+  std::uint8_t head[256] = {};  // the channel's name as the access layer fills it
+  std::uint32_t deviceType = fdtCAN_IF_VI_CAN_CARD_X;
+  std::uint8_t firstParameter = 1;   // board of the device
+  std::uint8_t secondParameter = 1;  // channel of the board
+  std::uint8_t reserved[2] = {};
+  std::uint32_t furtherValues[3] = {};  // copied from the matching available channel
+  std::uint8_t rest[256] = {};
+};
+static_assert(std::is_standard_layout_v<QFTCANInterfaceSettings> &&
+              std::is_trivially_copyable_v<QFTCANInterfaceSettings>);
+static_assert(sizeof(QFTCANInterfaceSettings) == 532);
+static_assert(offsetof(QFTCANInterfaceSettings, deviceType) == 256);
+static_assert(offsetof(QFTCANInterfaceSettings, firstParameter) == 260);
+static_assert(offsetof(QFTCANInterfaceSettings, secondParameter) == 261);
+static_assert(offsetof(QFTCANInterfaceSettings, furtherValues) == 264);
+static_assert(offsetof(QFTCANInterfaceSettings, rest) == 276);
+
+class QFCSystemProperty : public QFCAbstractObjectData {
+ public:
+  static constexpr std::int32_t kDefaultTransferTimeout = 1000;
+  static constexpr std::uint32_t kDefaultBusTiming0 = 0x47;
+  static constexpr std::uint32_t kDefaultBusTiming1 = 0x14;
+  // Message numbers of the spare texts, in the order first, second, third.
+  static constexpr int kSpareTextMessages[3] = {93, 99, 98};
+
+  ~QFCSystemProperty() override;
+
+  // The property part of the document: failure class file, spare texts,
+  // visible pin properties, platform and interface settings. Loading compares
+  // with or merges into what the pin file gave at open.
+  void Serialize(Archive& ar) override;
+
+  // ---- interface settings ----
+  const QFTSerialInterfaceSettings& GetSerialSettings() const { return serial_; }
+  // Refused (false) on a read-only system (message 118), while a transfer
+  // interface is connected (message 169) and for a null record.
+  bool SetSerialSettings(const QFTSerialInterfaceSettings* settings);
+  const QFTCANInterfaceSettings& GetCANSettings() const { return can_; }
+  bool SetCANSettings(const QFTCANInterfaceSettings* settings);
+  void GetBusTiming(std::uint32_t& first, std::uint32_t& second) const;
+  void SetBusTiming(std::uint32_t first, std::uint32_t second);
+
+  // (device type, port number, 0) for the KR40 family, (device type, first,
+  // second interface parameter) for KR60; other platforms leave the values.
+  HRESULT GetInterfaceParameter(std::int32_t& deviceType, std::int32_t& value1, std::int32_t& value2) const;
+  // Takes effect at the next connect. Message 57 for a device type that does
+  // not suit the platform.
+  HRESULT SetInterfaceParameter(std::int32_t deviceType, std::int32_t value1, std::int32_t value2);
+  // True when none of the system's transfer interfaces is connected.
+  bool IsInterfaceFree() const;
+
+  // The number of answer wait passes: the decimal "Timeout" setting, 1000
+  // without it; a value that is not a decimal number is reported (message 37,
+  // class 2) and 1000 is used. Read anew on every call: each transfer
+  // interface asks once and keeps the answer.
+  static std::int32_t GetTransferTimeout();
+
+  // ---- transfer interfaces ----
+  QFCAbstractTransferInterface* GetTransferInterface() const { return currentTransferInterface_; }
+  // Takes the interface and makes it the current one.
+  void AddTransferInterface(std::unique_ptr<QFCAbstractTransferInterface> transferInterface);
+  const std::vector<std::unique_ptr<QFCAbstractTransferInterface>>& GetTransferInterfaces() const {
+    return transferInterfaces_;
+  }
+
+  // ---- descriptive properties ----
+  const std::string& GetAuthor() const { return author_; }
+  const std::string& GetDescription() const { return description_; }
+  std::int32_t GetECUVersion() const { return ecuVersion_; }
+  const std::string& GetPinFilePath() const { return pinFilePath_; }
+  const std::string& GetPinFileTitle() const { return pinFileTitle_; }
+  const std::string& GetFailureClassFile() const { return failureClassFile_; }
+  const std::vector<std::string>& GetAdditionalPinFiles() const { return additionalPinFiles_; }
+  const std::vector<std::string>& GetPotentialNames() const { return potentialNames_; }
+  std::int32_t GetPlatformType() const { return platformType_; }
+  const std::string& GetBoardType() const { return boardType_; }
+  // 0, 1 or 2 for the first, second and third spare text; 3 for the fourth, which is never stored.
+  const std::string& GetSpareText(int index) const;
+  // Pin column name (lower case) to its flag (1 = shown in the pattern views).
+  std::map<std::string, std::int32_t>& GetVisiblePinProperties() { return visiblePinProperties_; }
+  const std::map<std::string, std::int32_t>& GetVisiblePinProperties() const { return visiblePinProperties_; }
+  // The labels used when pin texts are formatted for display: pin, ECU,
+  // module, channel, failure classes.
+  const std::string& GetLabelText(int index) const;
+
+  // ---- connection state (kept up to date by the connection logic) ----
+  bool IsConnected() const override { return connected_; }
+  void SetConnectedFlag(bool connected) { connected_ = connected; }
+  // Modules that answered the last hardware reset.
+  std::set<std::uint16_t>& GetRespondingModules() { return respondingModules_; }
+  const std::set<std::uint16_t>& GetRespondingModules() const { return respondingModules_; }
+
+ protected:
+  explicit QFCSystemProperty(std::string name);
+
+  // Sets the pin file path and its title (the name after the last separator).
+  void SetPinFile(const std::string& path);
+
+  std::set<std::uint16_t> respondingModules_;
+  std::vector<std::string> additionalPinFiles_;
+  std::string failureClassFile_;
+  std::string description_;
+  std::string pinFileTitle_;
+  std::string pinFilePath_;
+  std::string author_;
+  std::int32_t platformType_ = 0;
+  std::int32_t ecuVersion_ = 0;
+  std::array<std::string, 4> spareTexts_;
+  std::vector<std::string> potentialNames_;
+  std::string boardType_;
+  bool connected_ = false;
+  std::map<std::string, std::int32_t> visiblePinProperties_;
+
+ private:
+  void StoreProperties(Archive& ar) const;
+  void LoadProperties(Archive& ar);
+
+  QFCAbstractTransferInterface* currentTransferInterface_ = nullptr;
+  std::vector<std::unique_ptr<QFCAbstractTransferInterface>> transferInterfaces_;
+  std::uint32_t busTiming0_ = kDefaultBusTiming0;
+  std::uint32_t busTiming1_ = kDefaultBusTiming1;
+  QFTCANInterfaceSettings can_;
+  QFTSerialInterfaceSettings serial_;
+  std::array<std::string, 5> labels_;
+};
+
+}  // namespace faultbox
