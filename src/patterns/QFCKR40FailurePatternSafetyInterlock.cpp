@@ -1,0 +1,76 @@
+// The KR40 family's interlock: every pin checked on its own, and the KR80
+// board limited to failure classes 1, 2 and 3.
+#include "patterns/QFCKR40FailurePatternSafetyInterlock.h"
+
+#include <algorithm>
+
+#include "host/QFCFaultboxApp.h"
+#include "patterns/QFCFailurePatternPins.h"
+#include "patterns/QFCKR40FailurePattern.h"
+#include "patterns/QFCKR40FailurePatternPin.h"
+#include "systems/QFCSystem.h"
+
+namespace faultbox {
+
+namespace {
+
+constexpr int kPlaceCheckAllNoPattern = 6501;
+constexpr int kPlaceCheckAllNoClasses = 6502;
+
+}  // namespace
+
+QFCAbstractFailurePattern* QFCKR40FailurePatternSafetyInterlock::GetPattern() const {
+  return pattern_;
+}
+
+bool QFCKR40FailurePatternSafetyInterlock::IsPlatformPin(const QFCAbstractFailurePatternPin* pin) const {
+  return dynamic_cast<const QFCKR40FailurePatternPin*>(pin) != nullptr;
+}
+
+bool QFCKR40FailurePatternSafetyInterlock::IsKR80Board() const {
+  const QFCSystem* system = pattern_ ? pattern_->GetOwnerSystem() : nullptr;
+  if (system == nullptr) return false;
+  const std::string& board = system->GetBoardType();
+  return board == "KR80" || board == "KR080";
+}
+
+void QFCKR40FailurePatternSafetyInterlock::FilterCandidates(
+    std::vector<QFTFoundFailureClass>& candidates) const {
+  if (!IsKR80Board()) return;
+  candidates.erase(std::remove_if(candidates.begin(), candidates.end(),
+                                  [](const QFTFoundFailureClass& c) {
+                                    return c.failureClassId < 1 || c.failureClassId > 3;
+                                  }),
+                   candidates.end());
+}
+
+bool QFCKR40FailurePatternSafetyInterlock::CheckPinWith(QFCAbstractFailurePatternPin* pin,
+                                                        const QFCAbstractFailureClasses* classes,
+                                                        std::vector<std::uint32_t>* requirement) {
+  return CheckPinSkeleton(pin, classes, requirement);
+}
+
+bool QFCKR40FailurePatternSafetyInterlock::CheckPin(QFCAbstractFailurePatternPin* pin) {
+  return CheckPinWith(pin, nullptr, nullptr);
+}
+
+bool QFCKR40FailurePatternSafetyInterlock::CheckAll() {
+  if (pattern_ == nullptr) {
+    TheApp().ReportInternalFault(kPlaceCheckAllNoPattern);
+    return false;
+  }
+  if (!pattern_->IsInterlockEnabled()) return true;
+  const QFCAbstractFailureClasses* classes = pattern_->GetFailureClasses();
+  if (classes == nullptr) {
+    TheApp().ReportInternalFault(kPlaceCheckAllNoClasses);
+    return false;
+  }
+  QFCFailurePatternPins* pins = pattern_->GetPins();
+  if (pins == nullptr) return true;
+  FullCheckScope scope(*this);
+  for (const auto& pin : pins->GetList())
+    if (!CheckPinWith(pin.get(), classes, nullptr)) return false;
+  return true;
+}
+
+}  // namespace faultbox
