@@ -60,6 +60,12 @@ class QFCAbstractObjectData {
   // Marks that document modified; the system ignores it while read-only.
   virtual void SetModified();
 
+  // Set while loading when the document differs from the pin file (pins lost
+  // from it, pin values that differ); the document then reports it and comes
+  // up modified.
+  void SetChanged(bool changed) { changed_ = changed; }
+  bool IsChanged() const { return changed_; }
+
   // The object of kind 1 up the owner chain, or nullptr.
   QFCAbstractObjectData* GetSystem() const;
 
@@ -81,6 +87,7 @@ class QFCAbstractObjectData {
   std::int32_t kind_;
   QFCAbstractObjectData* owner_;
   std::vector<QFCObjectObserver*> observers_;
+  bool changed_ = false;
 };
 
 }  // namespace faultbox

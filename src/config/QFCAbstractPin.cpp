@@ -308,6 +308,7 @@ void QFCAbstractPin::LoadCompared(Archive& ar) {
   auto differs = [&](std::string_view column) {
     TheApp().ReportWarning(142, std::string(column), where);
     SetModified();
+    if (QFCAbstractObjectData* system = GetSystem()) system->SetChanged(true);
   };
   if (storedFailureText != GetFailureClassText()) differs(kFailureClassLabel);
   if (storedN != ecuVersion_ || storedN2 != ecuVersion_) {

@@ -13,6 +13,9 @@
 #include "config/QFCKR40HardwareInfo.h"
 #include "config/QFCKR60HardwareInfo.h"
 #include "host/QFCFaultboxApp.h"
+#include "patterns/QFCAbstractFailurePattern.h"
+#include "patterns/QFCFailurePatternNode.h"
+#include "patterns/QFCFailurePatterns.h"
 #include "platform/Archive.h"
 #include "platform/FileHelper.h"
 #include "platform/MessageTable.h"
@@ -75,10 +78,16 @@ QFCSystem::QFCSystem(std::string name, const std::string& pinFilePath, std::int3
   ecuVersion_ = ecuVersion;
   author_ = std::move(author);
   description_ = std::move(description);
+  patterns_ = std::make_unique<QFCFailurePatterns>(this);
+  rootFolder_ = std::make_unique<QFCFailurePatternNode>(this, patterns_.get());
+  patterns_->SetRootFolder(rootFolder_.get());
 }
 
 QFCSystem::~QFCSystem() {
   DisconnectSilently();
+  // Pattern pins refer to the pins of the hardware descriptions: they go first.
+  rootFolder_.reset();
+  patterns_.reset();
   // The ECUs belong to the hardware descriptions: forget them first.
   ecus_.clear();
   hardwareInfos_.clear();
@@ -342,6 +351,8 @@ void QFCSystem::Serialize(Archive& ar) {
       if (!ecu->IsEnabled()) disabled.push_back(&ecu->GetName());
     ar.WriteU32(static_cast<std::uint32_t>(disabled.size()));
     for (const std::string* name : disabled) ar.WriteString(*name);
+    patterns_->Serialize(ar);
+    rootFolder_->Serialize(ar);
     return;
   }
   // Every name takes at least its one-byte length.
@@ -352,6 +363,20 @@ void QFCSystem::Serialize(Archive& ar) {
   // ECUs that the pin file no longer has are forgotten.
   for (QFCECU* ecu : ecus_)
     if (disabled.count(ecu->GetName()) != 0) ecu->SetEnabled(false, true);
+  // The patterns load after the ECU states, so that their interlock runs see them.
+  patterns_->Serialize(ar);
+  rootFolder_->Serialize(ar);
+  if (patterns_->HasLoadChanges()) SetChanged(true);
+}
+
+bool QFCSystem::HasActivatedPattern(QFCAbstractFailurePattern*& pattern) const {
+  pattern = nullptr;
+  return patterns_ && patterns_->GetActivatedPattern(pattern);
+}
+
+bool QFCSystem::IsPatternActivated() const {
+  QFCAbstractFailurePattern* pattern = nullptr;
+  return HasActivatedPattern(pattern);
 }
 
 }  // namespace faultbox

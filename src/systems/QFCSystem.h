@@ -15,6 +15,9 @@ namespace faultbox {
 class QFCAbstractFailureClasses;
 class QFCAbstractHardwareInfo;
 class QFCECU;
+class QFCAbstractFailurePattern;
+class QFCFailurePatterns;
+class QFCFailurePatternNode;
 
 class QFCSystem : public QFCSystemProperty {
  public:
@@ -62,7 +65,13 @@ class QFCSystem : public QFCSystemProperty {
   // True when the document file that holds the system is write-protected; a
   // system that no saved document holds is writable.
   bool IsReadOnly() const override;
-  bool IsPatternActivated() const override { return false; }
+  bool IsPatternActivated() const override;
+  // True when a pattern has an activated pin; `pattern` is that pattern.
+  bool HasActivatedPattern(QFCAbstractFailurePattern*& pattern) const;
+
+  // The pattern collection and the root of the pattern folders.
+  QFCFailurePatterns* GetFailurePatterns() const { return patterns_.get(); }
+  QFCFailurePatternNode* GetRootFolder() const { return rootFolder_.get(); }
   // Marks the document modified; ignored while read-only.
   void SetModified() override;
   bool IsModified() const { return modified_; }
@@ -114,6 +123,8 @@ class QFCSystem : public QFCSystemProperty {
   std::string failureClassPathUsed_;
   std::string documentPath_;
   bool modified_ = false;
+  std::unique_ptr<QFCFailurePatterns> patterns_;
+  std::unique_ptr<QFCFailurePatternNode> rootFolder_;
 };
 
 }  // namespace faultbox

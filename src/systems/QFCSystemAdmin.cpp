@@ -1,6 +1,8 @@
 // Names, lookup and removal of the open systems.
 #include "systems/QFCSystemAdmin.h"
 
+#include "patterns/QFCAbstractFailurePattern.h"
+
 #include "config/QFCFSHelper.h"
 #include "host/QFCFaultboxApp.h"
 #include "platform/MessageTable.h"
@@ -120,6 +122,16 @@ QFCSystem* QFCSystemAdmin::FindOtherSystemOnSameHil(const QFCSystem* system) con
 void QFCSystemAdmin::GetConnectedSystems(std::vector<QFCSystem*>& systems) const {
   for (const auto& system : systems_)
     if (system->IsConnected()) systems.push_back(system.get());
+}
+
+void QFCSystemAdmin::DeactivateAll() {
+  for (const auto& system : systems_) {
+    QFCAbstractFailurePattern* pattern = nullptr;
+    if (!system->HasActivatedPattern(pattern) || pattern == nullptr) continue;
+    pattern->SelectAllPins(true);
+    pattern->ActivatePattern(false);
+    pattern->SelectAllPins(false);
+  }
 }
 
 }  // namespace faultbox

@@ -47,6 +47,9 @@ class QFCSystemAdmin {
   // FIU load address, an unreadable one counting as 0), or nullptr. KR40-family
   // systems never share a simulator.
   QFCSystem* FindOtherSystemOnSameHil(const QFCSystem* system) const;
+  // Deactivates the activated pattern of every system: all its pins take part
+  // in the deactivation and are deselected afterwards.
+  void DeactivateAll();
   // Appends every connected system, in the order of creation.
   void GetConnectedSystems(std::vector<QFCSystem*>& systems) const;
 

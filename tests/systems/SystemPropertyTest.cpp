@@ -316,6 +316,8 @@ struct Bytes {
       Str(column).U32(column == hidden ? 0 : 1);
     return *this;
   }
+  // An empty pattern collection and an empty root folder, which end the system's part.
+  Bytes& NoPatterns() { return U32(0).Str(ResourceString(6768)).U32(0).U32(0); }
 };
 
 TEST(SystemDocumentTest, KR40PartByteForByte) {
@@ -329,7 +331,7 @@ TEST(SystemDocumentTest, KR40PartByteForByte) {
   Bytes expected;
   expected.Str("kr40.fcd").Str("").Str("").Str("").KR40Columns("fiu_module_id");
   expected.U32(1).Str("COM7").U32(7).U32(200);
-  expected.U32(1).Str("Brake");
+  expected.U32(1).Str("Brake").NoPatterns();
   EXPECT_EQ(ar.Data(), expected.data);
 }
 
@@ -348,7 +350,7 @@ TEST(SystemDocumentTest, KR60PartByteForByteAndBack) {
                              "load_module_id", "pin_name(1)"})
     expected.Str(column).U32(std::string(column) == "load_module_id" ? 0 : 1);
   expected.U32(2).U32(4).U8(2).U8(3).U32(0x01).U32(0x1C);
-  expected.U32(1).Str("Engine");
+  expected.U32(1).Str("Engine").NoPatterns();
   EXPECT_EQ(stored.Data(), expected.data);
 
   auto reopened = OpenSystem(bench, PinFile::KR60());
@@ -417,7 +419,7 @@ TEST_P(SystemDocumentLoadTest, ComparesAndMerges) {
 
 Bytes Kr40Tail() {
   Bytes b;
-  b.U32(1).Str("COM5").U32(5).U32(200).U32(2).Str("Brake").Str("NoSuchEcu");
+  b.U32(1).Str("COM5").U32(5).U32(200).U32(2).Str("Brake").Str("NoSuchEcu").NoPatterns();
   return b;
 }
 
