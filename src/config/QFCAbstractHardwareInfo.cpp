@@ -169,17 +169,22 @@ std::int32_t QFCAbstractHardwareInfo::FindOrReport(std::string_view tag, std::in
   return position;
 }
 
-HRESULT QFCAbstractHardwareInfo::LoadPinFile(bool additional) {
+HRESULT QFCAbstractHardwareInfo::OpenPinFile(int placeCannotOpen, int placeNotOpened) {
   if (!parser_.Open(pinFilePath_)) {
     TheApp().ReportError(46, pinFilePath_);
-    TheApp().ReportInternalFault(738);
+    TheApp().ReportInternalFault(placeCannotOpen);
     return E_FAULTBOX_CANN_NOT_OPEN_FILE;
   }
   if (!parser_.IsOpen()) {
     TheApp().ReportError(46, pinFilePath_);
-    TheApp().ReportInternalFault(739);
+    TheApp().ReportInternalFault(placeNotOpened);
     return E_FAULTBOX_FILE_IS_NOT_OPENED;
   }
+  return FAULTBOX_OK;
+}
+
+HRESULT QFCAbstractHardwareInfo::LoadPinFile(bool additional) {
+  if (HRESULT opened = OpenPinFile(738, 739); opened != FAULTBOX_OK) return opened;
   TheApp().ReportInternal(154);
   TheApp().ReportInfo(152, pinFilePath_);
   pinPlatform_ = -1;
@@ -201,16 +206,7 @@ HRESULT QFCAbstractHardwareInfo::LoadPinFile(bool additional) {
 }
 
 HRESULT QFCAbstractHardwareInfo::DetectBoardType(std::int32_t& platform) {
-  if (!parser_.Open(pinFilePath_)) {
-    TheApp().ReportError(46, pinFilePath_);
-    TheApp().ReportInternalFault(740);
-    return E_FAULTBOX_CANN_NOT_OPEN_FILE;
-  }
-  if (!parser_.IsOpen()) {
-    TheApp().ReportError(46, pinFilePath_);
-    TheApp().ReportInternalFault(741);
-    return E_FAULTBOX_FILE_IS_NOT_OPENED;
-  }
+  if (HRESULT opened = OpenPinFile(740, 741); opened != FAULTBOX_OK) return opened;
   HRESULT hr = CheckTags();
   if (hr == FAULTBOX_OK) hr = ReadFormat(true);
   if (hr == FAULTBOX_OK) {

@@ -98,6 +98,9 @@ class QFCAbstractHardwareInfo : public QFCAbstractObjectData {
   HRESULT ReadHeader();
   HRESULT ReadPins();
   HRESULT ParsePinLine(const std::vector<std::string_view>& fields);
+  // Opens the pin file for reading; a failure is reported (message 46 and
+  // the internal fault of the given place) and returned.
+  HRESULT OpenPinFile(int placeCannotOpen, int placeNotOpened);
   std::int32_t FindOrReport(std::string_view tag, std::int32_t start);
 
   QFCCSVFileParser parser_;

@@ -2,6 +2,8 @@
 // case-insensitive text helpers.
 #include "config/QFCFSHelper.h"
 
+#include "platform/Text.h"
+
 #include <algorithm>
 #include <set>
 
@@ -153,38 +155,14 @@ bool QFCFSHelper::PathExists(const std::string& path) {
   return !path.empty() && QFCFileHelper::Exists(QFCFileHelper::ToNative(path));
 }
 
-bool QFCFSHelper::EqualNoCase(std::string_view a, std::string_view b) {
-  return a.size() == b.size() && CompareNoCase(a, b) == 0;
-}
+// One comparison without regard to case for the whole component.
+bool QFCFSHelper::EqualNoCase(std::string_view a, std::string_view b) { return EqualsNoCase(a, b); }
 
-int QFCFSHelper::CompareNoCase(std::string_view a, std::string_view b) {
-  auto lower = [](char c) -> unsigned char {
-    return static_cast<unsigned char>((c >= 'A' && c <= 'Z') ? c - 'A' + 'a' : c);
-  };
-  const std::size_t n = std::min(a.size(), b.size());
-  for (std::size_t i = 0; i < n; ++i) {
-    const unsigned char x = lower(a[i]);
-    const unsigned char y = lower(b[i]);
-    if (x != y) return x < y ? -1 : 1;
-  }
-  return a.size() == b.size() ? 0 : (a.size() < b.size() ? -1 : 1);
-}
+int QFCFSHelper::CompareNoCase(std::string_view a, std::string_view b) { return faultbox::CompareNoCase(a, b); }
 
-std::string QFCFSHelper::ToLower(std::string_view text) {
-  std::string out(text);
-  for (char& c : out) {
-    if (c >= 'A' && c <= 'Z') c = static_cast<char>(c - 'A' + 'a');
-  }
-  return out;
-}
+std::string QFCFSHelper::ToLower(std::string_view text) { return faultbox::ToLower(text); }
 
-std::string QFCFSHelper::ToUpper(std::string_view text) {
-  std::string out(text);
-  for (char& c : out) {
-    if (c >= 'a' && c <= 'z') c = static_cast<char>(c - 'a' + 'A');
-  }
-  return out;
-}
+std::string QFCFSHelper::ToUpper(std::string_view text) { return faultbox::ToUpper(text); }
 
 std::string_view QFCFSHelper::Trim(std::string_view text) {
   std::size_t begin = 0;

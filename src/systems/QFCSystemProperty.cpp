@@ -63,7 +63,7 @@ const std::string& QFCSystemProperty::GetLabelText(int index) const {
 
 // ---- interface settings ----
 
-bool QFCSystemProperty::SetSerialSettings(const QFTSerialInterfaceSettings* settings) {
+bool QFCSystemProperty::MaySetSettings(const void* settings) const {
   if (IsReadOnly()) {
     TheApp().ReportError(kMsgReadOnly, GetName());
     return false;
@@ -72,7 +72,11 @@ bool QFCSystemProperty::SetSerialSettings(const QFTSerialInterfaceSettings* sett
     TheApp().ReportError(kMsgInterfaceConnected, {}, {}, kShown);
     return false;
   }
-  if (settings == nullptr) return false;
+  return settings != nullptr;
+}
+
+bool QFCSystemProperty::SetSerialSettings(const QFTSerialInterfaceSettings* settings) {
+  if (!MaySetSettings(settings)) return false;
   serial_.portName = settings->portName;
   serial_.deviceType = settings->deviceType;
   serial_.portNumber = settings->portNumber;
@@ -81,15 +85,7 @@ bool QFCSystemProperty::SetSerialSettings(const QFTSerialInterfaceSettings* sett
 }
 
 bool QFCSystemProperty::SetCANSettings(const QFTCANInterfaceSettings* settings) {
-  if (IsReadOnly()) {
-    TheApp().ReportError(kMsgReadOnly, GetName());
-    return false;
-  }
-  if (!IsInterfaceFree()) {
-    TheApp().ReportError(kMsgInterfaceConnected, {}, {}, kShown);
-    return false;
-  }
-  if (settings == nullptr) return false;
+  if (!MaySetSettings(settings)) return false;
   // The channel head and the rest belong to the access layer and stay as they are.
   can_.deviceType = settings->deviceType;
   can_.firstParameter = settings->firstParameter;

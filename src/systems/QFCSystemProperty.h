@@ -154,6 +154,10 @@ class QFCSystemProperty : public QFCAbstractObjectData {
   std::map<std::string, std::int32_t> visiblePinProperties_;
 
  private:
+  // The read-only and connected checks that every settings change passes
+  // (messages 118 and 169); a null record is refused without a message.
+  bool MaySetSettings(const void* settings) const;
+
   void StoreProperties(Archive& ar) const;
   void LoadProperties(Archive& ar);
 
