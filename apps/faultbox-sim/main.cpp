@@ -1,0 +1,212 @@
+// faultbox-sim: runs one simulated bench until it is told to stop, so that
+// the faultbox tools can connect to it as to real hardware. The first line on
+// standard output names what to connect to.
+#include <pthread.h>
+#include <signal.h>
+#include <CLI/CLI.hpp>
+
+#include <cstdio>
+#include <functional>
+#include <memory>
+#include <mutex>
+#include <string>
+#include <utility>
+#include <vector>
+
+#include "host/QFCFaultboxApp.h"
+#include "kr40/KR40Simulator.h"
+
+namespace faultbox::simapp {
+namespace {
+
+// Lines go out whole, and never before the first line that names the port.
+std::mutex printMutex;
+
+void PrintLine(const std::string& line) {
+  std::lock_guard<std::mutex> lock(printMutex);
+  std::fputs(line.c_str(), stdout);
+  std::fputc('\n', stdout);
+  std::fflush(stdout);
+}
+
+// What the main loop needs of a running simulator; destroying it stops the
+// simulator.
+class Session {
+ public:
+  virtual ~Session() = default;
+  virtual std::string ConnectTo() const = 0;
+};
+
+struct Common {
+  bool verbose = false;
+};
+
+// Starts the simulator that a subcommand's options describe; nullptr with
+// `error` set when it cannot.
+using Starter = std::function<std::unique_ptr<Session>(const Common&, std::string* error)>;
+
+// One simulator kind: its subcommand name and help, and the function that
+// adds its options to the subcommand and returns its starter. Another bench
+// kind is one more row of kSubcommands.
+struct Subcommand {
+  const char* name;
+  const char* help;
+  Starter (*add)(CLI::App& command);
+};
+
+// ---------------------------------------------------------------------------
+// KR40 family
+
+class KR40Session : public Session {
+ public:
+  explicit KR40Session(std::unique_ptr<sim::KR40Simulator> sim) : sim_(std::move(sim)) {}
+  std::string ConnectTo() const override { return sim_->PortPath(); }
+
+ private:
+  std::unique_ptr<sim::KR40Simulator> sim_;
+};
+
+std::string Hex2(std::uint32_t value) {
+  char text[8];
+  std::snprintf(text, sizeof text, "0x%02X", value);
+  return text;
+}
+
+std::string Describe(const sim::KR40Event& event) {
+  std::string line = event.kind == sim::KR40Event::Kind::kExecute ? "execute " : "reset ";
+  line += std::to_string(event.number) + ":";
+  if (event.states.empty()) return line + " all relays off";
+  for (const auto& [module, relays] : event.states) {
+    line += " module " + Hex2(module) + " relays";
+    for (const auto& [relay, state] : relays)
+      line += " " + std::to_string(relay) + "=" + std::to_string(state);
+    line += ";";
+  }
+  line.pop_back();
+  return line;
+}
+
+struct KR40Args {
+  sim::KR40SimulatorOptions options;
+  std::string fault = "none";
+  int lateMs = 200;
+  std::uint64_t faultAfter = 0;
+};
+
+Starter AddKR40Family(CLI::App& command, sim::KR40Protocol protocol) {
+  auto args = std::make_shared<KR40Args>();
+  args->options.protocol = protocol;
+  command.add_option(
+      "--pin-file", args->options.pinFile,
+      "Pin file of the bench: only the relay modules it names answer (default: every address)");
+  command.add_option("--ecu-version", args->options.ecuVersion, "ECU version n of the pin file's columns")
+      ->capture_default_str();
+  command.add_option("--fault", args->fault, "Fault mode of every answer")
+      ->check(CLI::IsMember({"none", "silent", "wrong-checksum", "late"}))
+      ->capture_default_str();
+  command.add_option("--late-ms", args->lateMs, "Delay of a late answer in milliseconds")
+      ->check(CLI::Range(0, 3'600'000))
+      ->capture_default_str();
+  command.add_option("--fault-after", args->faultAfter, "Answers given correctly before the fault sets in")
+      ->capture_default_str();
+  command.add_flag("--timing", args->options.timing,
+                   "Take and answer bytes at the pace of a 9600 bit/s line");
+  return [args](const Common& common, std::string* error) -> std::unique_ptr<Session> {
+    sim::KR40SimulatorOptions options = args->options;
+    if (args->fault == "silent") options.fault.mode = sim::KR40FaultMode::kSilent;
+    if (args->fault == "wrong-checksum") options.fault.mode = sim::KR40FaultMode::kWrongChecksum;
+    if (args->fault == "late") options.fault.mode = sim::KR40FaultMode::kLate;
+    options.fault.lateBy = std::chrono::milliseconds(args->lateMs);
+    options.fault.afterAnswers = args->faultAfter;
+    if (common.verbose) options.onEvent = [](const sim::KR40Event& e) { PrintLine(Describe(e)); };
+    std::unique_ptr<sim::KR40Simulator> simulator = sim::KR40Simulator::Start(options, error);
+    if (!simulator) return nullptr;
+    return std::make_unique<KR40Session>(std::move(simulator));
+  };
+}
+
+Starter AddKR40(CLI::App& command) {
+  return AddKR40Family(command, sim::KR40Protocol::kA);
+}
+Starter AddKR80(CLI::App& command) {
+  return AddKR40Family(command, sim::KR40Protocol::kB);
+}
+
+const Subcommand kSubcommands[] = {
+    {"kr40", "A KR40 bench on a pseudo-terminal (protocol A, checksum answers)", AddKR40},
+    {"kr80", "A KR80 bench on a pseudo-terminal (protocol B, no answers)", AddKR80},
+};
+
+// Warnings and errors of the pin file reader go to standard error, one per
+// line; its progress notes only with --verbose.
+class StderrSink : public MessageSink {
+ public:
+  explicit StderrSink(bool verbose) : verbose_(verbose) {}
+  void Display(const ErrorRecord& record, bool) override {
+    if (!verbose_ && record.errorClass < 2) return;
+    std::fprintf(stderr, "faultbox-sim: message %d: %s\n", record.number, record.Text().c_str());
+  }
+
+ private:
+  bool verbose_;
+};
+
+}  // namespace
+}  // namespace faultbox::simapp
+
+int main(int argc, char** argv) {
+  using namespace faultbox;
+  using namespace faultbox::simapp;
+
+  // Blocked before any thread starts, so that only sigwait below sees them.
+  sigset_t stopSignals;
+  sigemptyset(&stopSignals);
+  sigaddset(&stopSignals, SIGINT);
+  sigaddset(&stopSignals, SIGTERM);
+  pthread_sigmask(SIG_BLOCK, &stopSignals, nullptr);
+  signal(SIGPIPE, SIG_IGN);
+
+  CLI::App app{"faultbox-sim: a simulated failure insertion bench to connect faultbox to"};
+  app.require_subcommand(1);
+  app.fallthrough();
+  Common common;
+  app.add_flag("--verbose", common.verbose, "Print a line for every execute and reset with the relay states");
+
+  std::vector<std::pair<CLI::App*, Starter>> commands;
+  for (const Subcommand& entry : kSubcommands) {
+    CLI::App* command = app.add_subcommand(entry.name, entry.help);
+    commands.emplace_back(command, entry.add(*command));
+  }
+  try {
+    app.parse(argc, argv);
+  } catch (const CLI::ParseError& e) {
+    const int code = app.exit(e);
+    return code == 0 ? 0 : 2;
+  }
+
+  StderrSink sink(common.verbose);
+  TheApp().StartReporting();
+  if (TheApp().Module()) TheApp().Module()->AddSink(&sink);
+
+  std::unique_ptr<Session> session;
+  std::string error;
+  {
+    // Held until the port is printed: a verbose line must not come first.
+    std::lock_guard<std::mutex> lock(printMutex);
+    for (auto& [command, start] : commands) {
+      if (command->parsed()) session = start(common, &error);
+    }
+    if (!session) {
+      std::fprintf(stderr, "faultbox-sim: %s\n", error.c_str());
+      return 1;
+    }
+    std::printf("%s\n", session->ConnectTo().c_str());
+    std::fflush(stdout);
+  }
+
+  int received = 0;
+  sigwait(&stopSignals, &received);
+  session.reset();
+  if (TheApp().Module()) TheApp().Module()->RemoveSink(&sink);
+  return 0;
+}
