@@ -1,7 +1,9 @@
-// The KR40 family's pattern: its parts, Reset, and the translation of a
-// failure class choice into PinConfig entries.
+// The KR40 family's pattern: its parts, Reset, the translation of a failure
+// class choice into PinConfig entries, and the sending of its serial bytes.
 #include "patterns/QFCKR40FailurePattern.h"
 
+#include "comm/QFCSerielleMessageBuilder.h"
+#include "comm/QFCSerielleTransferInterface.h"
 #include "config/QFCAbstractHardwareInfo.h"
 #include "config/QFCKR40Pin.h"
 #include "host/QFCFaultboxApp.h"
@@ -12,11 +14,85 @@
 
 namespace faultbox {
 
+namespace {
+
+constexpr int kMsgTimeOut = 69;
+constexpr int kMsgNotConnected = 120;
+constexpr int kMsgNotAnswered = 174;
+
+constexpr int kPlaceNoBuilder = 6611;
+constexpr int kPlaceNoTransferInterface = 6612;
+constexpr int kPlaceNotSerial = 6613;
+constexpr int kPlaceNotSerialMessage = 6614;
+
+}  // namespace
+
+QFCKR40FailurePattern::QFCKR40FailurePattern(std::string name, QFCSystem* system)
+    : QFCAbstractFailurePattern(std::move(name), system) {}
+
+QFCKR40FailurePattern::~QFCKR40FailurePattern() = default;
+
 HRESULT QFCKR40FailurePattern::Initialize() {
   ReleaseParts();
   if (HRESULT result = QFCAbstractFailurePattern::Initialize(); result != FAULTBOX_OK) return result;
   interlock_ = std::make_unique<QFCKR40FailurePatternSafetyInterlock>(this);
+  builder_ = std::make_unique<QFCSerielleMessageBuilder>(this, GetOwnerSystem());
   return FAULTBOX_OK;
+}
+
+void QFCKR40FailurePattern::ReleaseParts() {
+  QFCAbstractFailurePattern::ReleaseParts();
+  builder_.reset();
+}
+
+bool QFCKR40FailurePattern::BuildMessages(QFCMessageList& messages, bool activate) {
+  if (!builder_) {
+    TheApp().ReportInternalFault(kPlaceNoBuilder);
+    return false;
+  }
+  return builder_->BuildMessages(messages, activate);
+}
+
+HRESULT QFCKR40FailurePattern::TransferMessages(QFCMessageList& messages, bool) {
+  QFCSystem* system = GetOwnerSystem();
+  QFCAbstractTransferInterface* transfer = system ? system->GetTransferInterface() : nullptr;
+  if (transfer == nullptr) {
+    TheApp().ReportInternalFault(kPlaceNoTransferInterface);
+    return E_FAULTBOX_NULL_POINTER;
+  }
+  if (!transfer->IsConnected()) {
+    TheApp().ReportError(kMsgNotConnected);
+    return E_FAULTBOX_NOT_CONNECTED_TO_HARDWARE;
+  }
+  auto* serial = dynamic_cast<QFCSerielleTransferInterface*>(transfer);
+  if (serial == nullptr) {
+    TheApp().ReportInternalFault(kPlaceNotSerial);
+    return E_FAULTBOX_NULL_POINTER;
+  }
+  // A byte left over from before would be taken for an answer.
+  serial->FlushReceiveQueue();
+
+  // The bytes sent since the last answer: an answer is their checksum.
+  QFCSerielleMessageMap unanswered;
+  HRESULT result = FAULTBOX_OK;
+  for (std::size_t i = 0; i < messages.size(); ++i) {
+    const auto* message = dynamic_cast<const QFCSerielleMessage*>(messages[i].get());
+    if (message == nullptr) {
+      TheApp().ReportInternalFault(kPlaceNotSerialMessage);
+      return E_FAULTBOX_NULL_POINTER;
+    }
+    if ((result = serial->SendByte(message)) != FAULTBOX_OK) return result;
+    unanswered[static_cast<std::int32_t>(i)] = message;
+    if (!message->ExpectsAnswer()) continue;
+    result = serial->WaitForAnswers(unanswered);
+    unanswered.clear();
+    if (result == E_FAULTBOX_TIME_OUT) TheApp().ReportError(kMsgTimeOut);
+    if (result != FAULTBOX_OK) {
+      TheApp().ReportWarning(kMsgNotAnswered, ModuleAddressText(message->GetModuleAddress()));
+      return result;
+    }
+  }
+  return result;
 }
 
 bool QFCKR40FailurePattern::Reset() {
