@@ -1,7 +1,9 @@
-// The safety interlock on large KR40 patterns: a full check of 1 000 and
-// 10 000 pins, each defining five failure classes of three relay vectors,
-// and configuring every pin of a 1 000-pin pattern one PinConfig switch at a
-// time (each switch runs a full check, as in the standard user mode).
+// The safety interlock on large patterns: a full check of 1 000 and 10 000
+// pins, each defining five failure classes of three relay vectors, and
+// configuring every pin of a 1 000-pin pattern one PinConfig switch at a time
+// (each switch runs a full check, as in the standard user mode). KR40 pins,
+// and KR60 pins with the pattern's external hardware in use, so that the
+// exclusive-entry rule judges every pin with entry 0, 1 or 3 on.
 #include <benchmark/benchmark.h>
 
 #include <cstdio>
@@ -19,6 +21,7 @@
 #include "patterns/QFCFailurePatternPins.h"
 #include "patterns/QFCFailurePatterns.h"
 #include "patterns/QFCKR40FailurePattern.h"
+#include "patterns/QFCKR60FailurePattern.h"
 #include "platform/Settings.h"
 #include "systems/QFCSystem.h"
 
@@ -27,16 +30,24 @@ namespace {
 using namespace faultbox;
 namespace fs = std::filesystem;
 
-// A relay vector from the states of positions 0 to 4; the rest are off.
-QFTPossibility Vector(const char* states) {
-  QFTPossibility p(kRelayPositions, kRelayOff);
+enum class Platform { kKR40, kKR60 };
+
+// A relay vector from the states of positions 0 to 4. On KR40 the rest are
+// off; on KR60 the external hardware positions do not matter, except that the
+// first vector of each class needs the resistor on potential 0 and endpoint 2.
+QFTPossibility Vector(const char* states, Platform platform, bool first) {
+  QFTPossibility p(kRelayPositions, platform == Platform::kKR40 ? kRelayOff : kRelayAny);
   for (std::size_t k = 0; states[k] != '\0'; ++k) p.Set(k, static_cast<std::uint32_t>(states[k] - '0'), 0, 0);
+  if (platform == Platform::kKR60 && first) {
+    p.Set(5, kRelayOn, 0, 0);
+    p.Set(10, kRelayOn, 0, 0);
+  }
   return p;
 }
 
 // Five classes of three vectors: each class fits some PinConfig settings and
 // forbids others, so that the interlock has real work on every pin.
-void FillClasses(QFCAbstractFailureClasses& classes) {
+void FillClasses(QFCAbstractFailureClasses& classes, Platform platform) {
   static const char* kVectors[5][3] = {{"10000", "12000", "10200"},
                                        {"01000", "21000", "01002"},
                                        {"00100", "00120", "20100"},
@@ -47,35 +58,52 @@ void FillClasses(QFCAbstractFailureClasses& classes) {
     QFCAbstractFailureClass& fc = classes.AddFailureClass();
     fc.SetId(id);
     fc.SetName("Class " + std::to_string(id));
-    for (const char* v : kVectors[id - 1]) fc.AddPossibility(Vector(v));
+    for (int j = 0; j < 3; ++j) fc.AddPossibility(Vector(kVectors[id - 1][j], platform, j == 0));
   }
 }
 
-// A KR40 system of `pins` pins in 100-pin ECUs, each pin defining classes 1 to 5.
+// A system of `pins` pins in 100-pin ECUs, each pin defining classes 1 to 5.
+// KR60 pins each have a load channel of their own.
 class Rig {
  public:
-  explicit Rig(int pins) {
-    dir_ = fs::temp_directory_path() / ("faultbox-bench-interlock-" + std::to_string(pins));
+  explicit Rig(int pins, Platform platform = Platform::kKR40) {
+    const bool kr60 = platform == Platform::kKR60;
+    dir_ = fs::temp_directory_path() /
+           ("faultbox-bench-interlock-" + std::string(kr60 ? "kr60-" : "kr40-") + std::to_string(pins));
     fs::create_directories(dir_);
     Settings::SetPathOverride((dir_ / "faultbox.ini").string());
-    auto classes = QFCAbstractFailureClasses::Create(1);
+    auto classes = QFCAbstractFailureClasses::Create(kr60 ? 2 : 1);
     classes->SetVersion("bench");
-    FillClasses(*classes);
+    FillClasses(*classes, platform);
     const auto bytes = StoreFailureClasses(*classes);
-    std::ofstream((dir_ / "kr40.fcd").string(), std::ios::binary)
+    std::ofstream((dir_ / "classes.fcd").string(), std::ios::binary)
         .write(reinterpret_cast<const char*>(bytes.data()), static_cast<std::streamsize>(bytes.size()));
 
     std::ostringstream out;
     const char* eol = "\r\n";
     out << "/Comment" << eol << "interlock benchmark" << eol << "/CommentEnd" << eol << "/Format" << eol
-        << "BoardType;KR40" << eol << "AdditionalFiles;none" << eol << "FaultClassFile;kr40.fcd" << eol
-        << "/FormatEnd" << eol << "/Signallist" << eol << "columns" << eol
-        << "pin_name(1);ecu_name(1);faults_ecu(1);fiu_module_id;fiu_module_channel" << eol << eol << eol
-        << eol;
+        << "BoardType;" << (kr60 ? "KR60" : "KR40") << eol << "AdditionalFiles;none" << eol
+        << "FaultClassFile;classes.fcd" << eol;
+    if (kr60)
+      out << "Potential0;UBATT" << eol << "Potential1;GND" << eol << "Potential2;none" << eol
+          << "Potential3;none" << eol << "Potential4;U5V" << eol << "OffsetCANAddress;none" << eol
+          << "OffsetLoadAddress;7E0" << eol << "OffsetPowerSwitchAddress;none" << eol << "FIULoadAddress;none"
+          << eol << "RSIMLoadAddress;none" << eol << "FIUCANAddress;none" << eol << "RSIMCANAddress(1);none"
+          << eol << "RSIMCANAddress(2);none" << eol;
+    out << "/FormatEnd" << eol << "/Signallist" << eol << "columns" << eol
+        << (kr60 ? "pin_name(1);ecu_name(1);faults_ecu(1);load_channels_required;load_module_id;load_module_"
+                   "channel"
+                 : "pin_name(1);ecu_name(1);faults_ecu(1);fiu_module_id;fiu_module_channel")
+        << eol << eol << eol << eol;
     for (int i = 0; i < pins; ++i) {
-      char module[8];
-      std::snprintf(module, sizeof module, "%X", i % 128);
-      out << "P" << i << ";ECU" << i / 100 << ";1,2,3,4,5;" << module << ";" << i % 10 + 1 << eol;
+      out << "P" << i << ";ECU" << i / 100 << ";1,2,3,4,5;";
+      if (kr60) {
+        out << "1;" << i / 2560 << "_" << i / 160 % 16 << "_" << i / 10 % 16 << ";" << i % 10 << eol;
+      } else {
+        char module[8];
+        std::snprintf(module, sizeof module, "%X", i % 128);
+        out << module << ";" << i % 10 + 1 << eol;
+      }
     }
     out << "/SignallistEnd" << eol;
     const std::string path = (dir_ / "bench.csv").string();
@@ -86,11 +114,19 @@ class Rig {
       ok_ = false;
       return;
     }
-    FillClasses(*system_->GetFailureClasses());
+    FillClasses(*system_->GetFailureClasses(), platform);
     patterns_ = std::make_unique<QFCFailurePatterns>(system_.get());
     if (patterns_->CreatePattern(pattern_, "Bench") != FAULTBOX_OK) {
       ok_ = false;
       return;
+    }
+    // The resistor on potential UBATT between endpoints 2 and 3.
+    if (auto* kr60Pattern = dynamic_cast<QFCKR60FailurePattern*>(pattern_)) {
+      if (!kr60Pattern->SetPotentialChoice("UBATT", QFCExternHardware::kResistor) ||
+          !kr60Pattern->Connect(QFCExternHardware::kResistor, -1, 2, 3)) {
+        ok_ = false;
+        return;
+      }
     }
     std::vector<QFCAbstractPin*> all;
     for (QFCECU* ecu : system_->GetECUs())
@@ -117,8 +153,8 @@ class Rig {
   bool ok_ = true;
 };
 
-void BM_CheckAll(benchmark::State& state) {
-  Rig rig(static_cast<int>(state.range(0)));
+void CheckAll(benchmark::State& state, Platform platform) {
+  Rig rig(static_cast<int>(state.range(0)), platform);
   if (!rig.ok()) {
     state.SkipWithError("rig could not be built");
     return;
@@ -130,14 +166,27 @@ void BM_CheckAll(benchmark::State& state) {
     pins->GetAt(i)->SetPinConfigs({i % 5 == 0 ? 1u : 0u, 0, i % 5 == 2 ? 1u : 0u, 0, 0});
   for (auto _ : state) benchmark::DoNotOptimize(rig.pattern()->GetInterlock()->CheckAll());
   state.SetItemsProcessed(state.iterations() * state.range(0));
+  // What the check decided, so that a rig that gives no pin a class shows.
+  int withClass = 0;
+  for (int i = 0; i < pins->GetCount(); ++i) withClass += pins->GetAt(i)->GetFailureClassId() != -1 ? 1 : 0;
+  state.counters["pins_with_class"] = withClass;
+}
+
+void BM_CheckAll(benchmark::State& state) {
+  CheckAll(state, Platform::kKR40);
 }
 BENCHMARK(BM_CheckAll)->Arg(1000)->Arg(10000)->Unit(benchmark::kMillisecond);
+
+void BM_KR60CheckAll(benchmark::State& state) {
+  CheckAll(state, Platform::kKR60);
+}
+BENCHMARK(BM_KR60CheckAll)->Arg(1000)->Arg(10000)->Unit(benchmark::kMillisecond);
 
 // One iteration switches one entry on for every pin of the pattern, one
 // SetPinConfig at a time: the time per iteration is the total an engineer
 // waits while configuring the whole pattern.
-void BM_ConfigureEveryPin(benchmark::State& state) {
-  Rig rig(static_cast<int>(state.range(0)));
+void ConfigureEveryPin(benchmark::State& state, Platform platform) {
+  Rig rig(static_cast<int>(state.range(0)), platform);
   if (!rig.ok()) {
     state.SkipWithError("rig could not be built");
     return;
@@ -153,7 +202,16 @@ void BM_ConfigureEveryPin(benchmark::State& state) {
       benchmark::Counter(static_cast<double>(state.range(0)),
                          benchmark::Counter::kIsIterationInvariantRate | benchmark::Counter::kInvert);
 }
+
+void BM_ConfigureEveryPin(benchmark::State& state) {
+  ConfigureEveryPin(state, Platform::kKR40);
+}
 BENCHMARK(BM_ConfigureEveryPin)->Arg(1000)->Unit(benchmark::kMillisecond)->Iterations(3);
+
+void BM_KR60ConfigureEveryPin(benchmark::State& state) {
+  ConfigureEveryPin(state, Platform::kKR60);
+}
+BENCHMARK(BM_KR60ConfigureEveryPin)->Arg(1000)->Unit(benchmark::kMillisecond)->Iterations(3);
 
 }  // namespace
 

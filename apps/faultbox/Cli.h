@@ -4,9 +4,17 @@
 
 #include <CLI/CLI.hpp>
 #include <functional>
+#include <memory>
 #include <string>
+#include <utility>
+#include <vector>
 
 #include "host/ResultCodes.h"
+
+namespace faultbox {
+class QFCFaultboxDoc;
+class QFCSystemAdmin;
+}  // namespace faultbox
 
 namespace faultbox::cli {
 
@@ -24,10 +32,33 @@ void RegisterMessageCommands(CLI::App& app, Context& ctx);
 void RegisterPinfileCommands(CLI::App& app, Context& ctx);
 void RegisterFcdCommands(CLI::App& app, Context& ctx);
 void RegisterSystemCommands(CLI::App& app, Context& ctx);
+void RegisterDocCommands(CLI::App& app, Context& ctx);
+void RegisterPatternCommands(CLI::App& app, Context& ctx);
+
+// A pin as the command line names it: ECU name, then pin name.
+using PinName = std::pair<std::string, std::string>;
+// Adds the repeatable option "--pin ECU PIN" that collects into `pins`.
+CLI::Option* AddPinOption(CLI::App* command, std::vector<PinName>& pins, const std::string& help);
+
+// The document at `path`, loaded into `admin` with every message reported;
+// nullptr when it cannot be loaded (nothing is left behind in `admin`).
+std::unique_ptr<QFCFaultboxDoc> OpenDocument(QFCSystemAdmin& admin, const std::string& path);
+
+// Loads the document, lets `change` apply one change with the model's own
+// operations and, when it succeeds, saves the document atomically in place.
+// `change` describes what it did in `done` (a line per pin or item) for
+// standard output.
+// Answers the change's result, or the failure of loading or saving.
+using DocumentChange = std::function<HRESULT(QFCFaultboxDoc& doc, std::string& done)>;
+HRESULT EditDocument(const std::string& path, const DocumentChange& change);
 
 // Front-end message numbers (outside the component's own range).
 constexpr int kMsgCannotReadFile = 901;
 constexpr int kMsgUnknownMessage = 902;
 constexpr int kMsgCannotWriteFile = 912;
+constexpr int kMsgNoSuchPattern = 920;
+constexpr int kMsgNoSuchPin = 921;
+constexpr int kMsgPinNotInPattern = 922;
+constexpr int kMsgNoSuchEcu = 923;
 
 }  // namespace faultbox::cli

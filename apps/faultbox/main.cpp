@@ -53,6 +53,8 @@ constexpr Registrar kRegistrars[] = {
     RegisterPinfileCommands,
     RegisterFcdCommands,
     RegisterSystemCommands,
+    RegisterDocCommands,
+    RegisterPatternCommands,
 };
 
 }  // namespace

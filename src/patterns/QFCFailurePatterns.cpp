@@ -7,6 +7,7 @@
 #include "patterns/QFCFailurePatternNode.h"
 #include "patterns/QFCFailurePatternPins.h"
 #include "patterns/QFCKR40FailurePattern.h"
+#include "patterns/QFCKR60FailurePattern.h"
 #include "platform/Archive.h"
 #include "systems/QFCSystem.h"
 
@@ -40,6 +41,7 @@ std::int32_t QFCFailurePatterns::GetPlatformType() const {
 std::unique_ptr<QFCAbstractFailurePattern> QFCFailurePatterns::NewPattern(std::int32_t platformType,
                                                                           const std::string& name) {
   if (platformType == fptKR40Platform) return std::make_unique<QFCKR40FailurePattern>(name, system_);
+  if (platformType == fptKR60Platform) return std::make_unique<QFCKR60FailurePattern>(name, system_);
   return nullptr;
 }
 

@@ -176,12 +176,17 @@ constexpr Entry kMessages[] = {
     {178, "The document could not be loaded or saved: %1"},
     {179, "The document %1 has file version %2, which is newer than this program reads (1)."},
     {183, "User mode %1 (service mode) is active."},
+    {190, "The CAN access layer refused an operation: %1 (%2)"},
     // Front ends' own messages.
     {901, "Cannot read the file %1: %2"},
     {902, "There is no message number %1."},
     {910, "The failure class source %1 is not valid JSON: %2"},
     {911, "Failure class source %1: %2"},
     {912, "The file %1 cannot be written: %2"},
+    {920, "There is no failure pattern %1 in the document %2; `faultbox doc show` lists its patterns."},
+    {921, "There is no pin %1 of ECU %2 in the system's pin files (names are case-sensitive)."},
+    {922, "The failure pattern does not hold pin %1 of ECU %2; add it with `faultbox pattern add-pins`."},
+    {923, "There is no ECU %1 in the system's pin files (names are case-sensitive)."},
 };
 
 // Numbers 6701 and 6752 are document type descriptions: newline-separated

@@ -28,6 +28,7 @@ constexpr int kMsgInvalidValue = 37;
 constexpr int kMsgPotentialMissing = 41;
 constexpr int kMsgAdditionalFilePlatform = 86;
 constexpr int kMsgReadOnly = 118;
+constexpr int kMsgPatternActivated = 127;
 constexpr int kMsgPotentialTwice = 128;
 
 // Places named by internal faults of this file.
@@ -367,6 +368,55 @@ void QFCSystem::Serialize(Archive& ar) {
   patterns_->Serialize(ar);
   rootFolder_->Serialize(ar);
   if (patterns_->HasLoadChanges()) SetChanged(true);
+}
+
+// ---- patterns ----
+
+HRESULT QFCSystem::CreatePattern(const std::string& name, QFCAbstractFailurePattern*& pattern) {
+  pattern = nullptr;
+  if (!CheckWritable()) return E_FAULTBOX;
+  return patterns_->CreatePattern(pattern, name);
+}
+
+bool QFCSystem::RemovePattern(std::string_view name) {
+  if (!CheckWritable()) return false;
+  if (QFCAbstractFailurePattern* pattern = FindPattern(name);
+      pattern != nullptr && pattern->IsAnyPinActivated()) {
+    TheApp().ReportError(kMsgPatternActivated);
+    return false;
+  }
+  return patterns_->RemovePattern(name);
+}
+
+bool QFCSystem::RenamePattern(QFCAbstractFailurePattern* pattern, const std::string& name) {
+  if (!CheckWritable()) return false;
+  return patterns_->RenamePattern(pattern, name);
+}
+
+QFCAbstractFailurePattern* QFCSystem::FindPattern(std::string_view name) const {
+  return patterns_->FindPattern(name);
+}
+
+QFCECU* QFCSystem::FindECU(std::string_view name) const {
+  for (QFCECU* ecu : ecus_)
+    if (ecu->GetName() == name) return ecu;
+  return nullptr;
+}
+
+QFCAbstractPin* QFCSystem::FindPin(std::string_view ecuName, std::string_view pinName) const {
+  // Additional pin files may list an ECU of the same name again.
+  for (QFCECU* ecu : ecus_)
+    if (ecu->GetName() == ecuName)
+      if (QFCAbstractPin* pin = ecu->FindPin(pinName)) return pin;
+  return nullptr;
+}
+
+std::string QFCSystem::GetPinFileBoardType() const {
+  // Only the KR40 family keeps the board type; KR60 leaves it in the pin file.
+  if (!boardType_.empty() || hardwareInfos_.empty()) return boardType_;
+  std::string value;
+  hardwareInfos_.front()->GetFormatValue("BoardType", value);
+  return value;
 }
 
 bool QFCSystem::HasActivatedPattern(QFCAbstractFailurePattern*& pattern) const {

@@ -6,6 +6,7 @@
 #include <cstdint>
 #include <memory>
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include "systems/QFCSystemProperty.h"
@@ -16,6 +17,7 @@ class QFCAbstractFailureClasses;
 class QFCAbstractHardwareInfo;
 class QFCECU;
 class QFCAbstractFailurePattern;
+class QFCAbstractPin;
 class QFCFailurePatterns;
 class QFCFailurePatternNode;
 
@@ -72,6 +74,26 @@ class QFCSystem : public QFCSystemProperty {
   // The pattern collection and the root of the pattern folders.
   QFCFailurePatterns* GetFailurePatterns() const { return patterns_.get(); }
   QFCFailurePatternNode* GetRootFolder() const { return rootFolder_.get(); }
+
+  // ---- pattern operations with the read-only rule ----
+  // Each is refused with message 118 naming the system while the document is
+  // write-protected; the collection's own checks (unique names, message 87)
+  // follow. A successful change marks the document modified.
+  HRESULT CreatePattern(const std::string& name, QFCAbstractFailurePattern*& pattern);
+  // A pattern with an activated pin stays (message 127): its relays would be
+  // left switched with nothing to switch them back.
+  bool RemovePattern(std::string_view name);
+  bool RenamePattern(QFCAbstractFailurePattern* pattern, const std::string& name);
+  // The first pattern whose name is byte-for-byte `name`, or nullptr.
+  QFCAbstractFailurePattern* FindPattern(std::string_view name) const;
+
+  // The first ECU named exactly `name`, or nullptr.
+  QFCECU* FindECU(std::string_view name) const;
+  // The pin `pinName` of an ECU named `ecuName` (names compared exactly), or nullptr.
+  QFCAbstractPin* FindPin(std::string_view ecuName, std::string_view pinName) const;
+  // "BoardType" as the main pin file writes it ("" before the open read it).
+  std::string GetPinFileBoardType() const;
+
   // Marks the document modified; ignored while read-only.
   void SetModified() override;
   bool IsModified() const { return modified_; }

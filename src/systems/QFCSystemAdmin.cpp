@@ -85,6 +85,14 @@ void QFCSystemAdmin::Remove(const std::string& name) {
   }
 }
 
+void QFCSystemAdmin::Discard(const QFCSystem* system) {
+  for (auto it = systems_.begin(); it != systems_.end(); ++it) {
+    if (it->get() != system) continue;
+    systems_.erase(it);
+    return;
+  }
+}
+
 bool QFCSystemAdmin::Rename(QFCSystem* system, const std::string& newName) {
   if (system == nullptr) {
     TheApp().ReportInternalFault(kPlaceRenameInvalid);

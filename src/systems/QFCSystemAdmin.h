@@ -39,6 +39,9 @@ class QFCSystemAdmin {
 
   // Deletes the system of that name (message 117); the others keep their order.
   void Remove(const std::string& name);
+  // Deletes the system without a message: for a system that never became a
+  // document's (its load failed) or whose document object goes away.
+  void Discard(const QFCSystem* system);
   // Refused with message 88 when another system bears the new name; a change
   // of case of a system's own name is allowed.
   bool Rename(QFCSystem* system, const std::string& newName);
