@@ -46,6 +46,18 @@ class QFCKR60FailurePattern : public QFCAbstractFailurePattern {
   std::unique_ptr<QFCAbstractPin> CreatePlaceholderPin() override;
   std::unique_ptr<QFCAbstractFailurePatternPin> CreatePatternPin() override;
   void ReleaseParts() override;
+  // The CAN frames that switch the pins taking part, from a message builder
+  // made for the one build (QFCKR60FailurePatternMessages.cpp).
+  bool BuildMessages(QFCMessageList& messages, bool activate) override;
+  // Destroys every frame of the list.
+  void FreeMessages(QFCMessageList& messages) override;
+  // Sends the frames step by step over the system's CAN transfer interface
+  // (QFCKR60FailurePatternTransfer.cpp): each relay frame awaited alone, then
+  // the step's commits by module type, RSIM, LOAD, FIU when activating and
+  // FIU, LOAD, RSIM when deactivating, each awaited from the modules of its
+  // type that got relay frames in the step. The first failure ends it.
+  HRESULT TransferMessages(QFCMessageList& messages, bool activate) override;
+
   // The pattern record, then the external hardware settings; afterwards the
   // interlock derives every pin's class again.
   void Serialize(Archive& ar) override;
