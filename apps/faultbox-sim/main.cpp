@@ -40,6 +40,30 @@ class Session {
   virtual std::string ConnectTo() const = 0;
 };
 
+// A running simulator of the kind `Simulator`, reached at what `address` gives.
+template <class Simulator>
+class SimulatorSession : public Session {
+ public:
+  using Address = const std::string& (Simulator::*)() const;
+  SimulatorSession(std::unique_ptr<Simulator> sim, Address address)
+      : sim_(std::move(sim)), address_(address) {}
+  std::string ConnectTo() const override { return (sim_.get()->*address_)(); }
+
+ private:
+  std::unique_ptr<Simulator> sim_;
+  Address address_;
+};
+
+// Starts the simulator; nullptr with `error` set when it cannot.
+template <class Simulator, class Options>
+std::unique_ptr<Session> StartSession(const Options& options,
+                                      typename SimulatorSession<Simulator>::Address address,
+                                      std::string* error) {
+  std::unique_ptr<Simulator> simulator = Simulator::Start(options, error);
+  if (!simulator) return nullptr;
+  return std::make_unique<SimulatorSession<Simulator>>(std::move(simulator), address);
+}
+
 struct Common {
   bool verbose = false;
 };
@@ -59,15 +83,6 @@ struct Subcommand {
 
 // ---------------------------------------------------------------------------
 // KR40 family
-
-class KR40Session : public Session {
- public:
-  explicit KR40Session(std::unique_ptr<sim::KR40Simulator> sim) : sim_(std::move(sim)) {}
-  std::string ConnectTo() const override { return sim_->PortPath(); }
-
- private:
-  std::unique_ptr<sim::KR40Simulator> sim_;
-};
 
 std::string Hex2(std::uint32_t value) {
   char text[8];
@@ -122,9 +137,7 @@ Starter AddKR40Family(CLI::App& command, sim::KR40Protocol protocol) {
     options.fault.lateBy = std::chrono::milliseconds(args->lateMs);
     options.fault.afterAnswers = args->faultAfter;
     if (common.verbose) options.onEvent = [](const sim::KR40Event& e) { PrintLine(Describe(e)); };
-    std::unique_ptr<sim::KR40Simulator> simulator = sim::KR40Simulator::Start(options, error);
-    if (!simulator) return nullptr;
-    return std::make_unique<KR40Session>(std::move(simulator));
+    return StartSession<sim::KR40Simulator>(options, &sim::KR40Simulator::PortPath, error);
   };
 }
 
@@ -137,15 +150,6 @@ Starter AddKR80(CLI::App& command) {
 
 // ---------------------------------------------------------------------------
 // KR60
-
-class KR60Session : public Session {
- public:
-  explicit KR60Session(std::unique_ptr<sim::KR60Simulator> sim) : sim_(std::move(sim)) {}
-  std::string ConnectTo() const override { return sim_->Target(); }
-
- private:
-  std::unique_ptr<sim::KR60Simulator> sim_;
-};
 
 std::string Hex(std::uint64_t value, int digits) {
   char text[24];
@@ -276,9 +280,7 @@ Starter AddKR60(CLI::App& command) {
     }
     // Relay changes are what the bench is watched for: always printed.
     options.onEvent = [](const sim::KR60Event& e) { PrintLine(Describe(e)); };
-    std::unique_ptr<sim::KR60Simulator> simulator = sim::KR60Simulator::Start(options, error);
-    if (!simulator) return nullptr;
-    return std::make_unique<KR60Session>(std::move(simulator));
+    return StartSession<sim::KR60Simulator>(options, &sim::KR60Simulator::Target, error);
   };
 }
 

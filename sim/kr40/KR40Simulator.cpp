@@ -12,7 +12,6 @@
 #include <cerrno>
 #include <cstring>
 #include <ctime>
-#include <system_error>
 
 #include "config/QFCKR40HardwareInfo.h"
 #include "config/QFCKR40Pin.h"
@@ -147,13 +146,7 @@ bool KR40Simulator::Open(std::string* error) {
   }
   wakeFd_ = ::eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK);
   if (wakeFd_ < 0) return Fail(error, SystemError("eventfd"));
-  try {
-    thread_ = std::thread([this] { Run(); });
-  } catch (const std::system_error& e) {
-    return Fail(error, std::string("thread: ") + e.what());
-  }
-  running_ = true;
-  return true;
+  return StartThread([this] { Run(); }, error);
 }
 
 KR40Simulator::~KR40Simulator() {
@@ -163,13 +156,12 @@ KR40Simulator::~KR40Simulator() {
 }
 
 void KR40Simulator::Stop() {
-  if (!running_) return;
-  const std::uint64_t one = 1;
-  // An eventfd write fails only when the counter would overflow; the thread
-  // wakes either way because the counter is non-zero.
-  [[maybe_unused]] ssize_t written = ::write(wakeFd_, &one, sizeof one);
-  thread_.join();
-  running_ = false;
+  StopThread([this] {
+    const std::uint64_t one = 1;
+    // An eventfd write fails only when the counter would overflow; the thread
+    // wakes either way because the counter is non-zero.
+    [[maybe_unused]] ssize_t written = ::write(wakeFd_, &one, sizeof one);
+  });
 }
 
 const std::string& KR40Simulator::PortPath() const {
@@ -254,7 +246,7 @@ void KR40Simulator::Process(Clock::time_point now) {
     if (!any && counters_.answers == answers) return;
     events.swap(events_);
   }
-  changed_.notify_all();
+  NotifyCountersChanged();
   if (onEvent_) {
     for (const KR40Event& e : events) onEvent_(e);
   }
@@ -438,11 +430,6 @@ std::uint32_t KR40Simulator::RelayState(std::uint32_t module, std::uint32_t rela
   return r == m->second.end() ? 0 : r->second;
 }
 
-KR40Counters KR40Simulator::Counters() const {
-  std::lock_guard<std::mutex> lock(mutex_);
-  return counters_;
-}
-
 std::vector<std::uint8_t> KR40Simulator::ReceivedBytes() const {
   std::lock_guard<std::mutex> lock(mutex_);
   return {received_.begin(), received_.end()};
@@ -459,26 +446,12 @@ void KR40Simulator::SetFaultMode(const KR40Fault& fault) {
   answersSinceFault_ = 0;
 }
 
-bool KR40Simulator::WaitFor(const std::function<bool(const KR40Counters&)>& reached,
-                            std::chrono::milliseconds limit) const {
-  std::unique_lock<std::mutex> lock(mutex_);
-  return changed_.wait_for(lock, limit, [&] { return reached(counters_); });
-}
-
 bool KR40Simulator::WaitForProcessed(std::size_t bytes, std::chrono::milliseconds limit) const {
-  return WaitFor([bytes](const KR40Counters& c) { return c.bytesProcessed >= bytes; }, limit);
+  return WaitFor(&KR40Counters::bytesProcessed, bytes, limit);
 }
 
 bool KR40Simulator::WaitForExecutes(std::size_t count, std::chrono::milliseconds limit) const {
-  return WaitFor([count](const KR40Counters& c) { return c.executes >= count; }, limit);
-}
-
-bool KR40Simulator::WaitForResets(std::size_t count, std::chrono::milliseconds limit) const {
-  return WaitFor([count](const KR40Counters& c) { return c.resets >= count; }, limit);
-}
-
-bool KR40Simulator::WaitForAnswers(std::size_t count, std::chrono::milliseconds limit) const {
-  return WaitFor([count](const KR40Counters& c) { return c.answers >= count; }, limit);
+  return WaitFor(&KR40Counters::executes, count, limit);
 }
 
 }  // namespace faultbox::sim

@@ -6,19 +6,18 @@
 #pragma once
 
 #include <chrono>
-#include <condition_variable>
 #include <cstdint>
 #include <deque>
 #include <functional>
 #include <map>
 #include <memory>
-#include <mutex>
 #include <optional>
 #include <set>
 #include <string>
 #include <string_view>
-#include <thread>
 #include <vector>
+
+#include "SimulatorThread.h"
 
 namespace faultbox {
 class PseudoTerminal;
@@ -86,7 +85,7 @@ struct KR40SimulatorOptions {
   std::function<void(const KR40Event&)> onEvent;
 };
 
-class KR40Simulator {
+class KR40Simulator : public SimulatorThread<KR40Counters> {
  public:
   // One byte on a 9600 bit/s 8N1 line: start bit, 8 data bits, stop bit.
   static constexpr std::chrono::nanoseconds kByteTime{10'000'000'000LL / 9600};
@@ -98,8 +97,6 @@ class KR40Simulator {
   static std::unique_ptr<KR40Simulator> Start(const KR40SimulatorOptions& options,
                                               std::string* error = nullptr);
   ~KR40Simulator();
-  KR40Simulator(const KR40Simulator&) = delete;
-  KR40Simulator& operator=(const KR40Simulator&) = delete;
 
   // Ends the thread; answers still waiting to be sent are dropped. Safe to
   // call twice.
@@ -114,7 +111,6 @@ class KR40Simulator {
   KR40RelayStates RelayStates() const;
   // The state of one relay, 0 when off.
   std::uint32_t RelayState(std::uint32_t module, std::uint32_t relay) const;
-  KR40Counters Counters() const;
   // Every byte decoded so far (the last kLogLimit), and every answer sent.
   std::vector<std::uint8_t> ReceivedBytes() const;
   std::vector<std::uint8_t> SentBytes() const;
@@ -123,11 +119,10 @@ class KR40Simulator {
   void SetFaultMode(KR40FaultMode mode) { SetFaultMode(KR40Fault{mode}); }
 
   // Wait until the counters reach the given totals (counted since the
-  // start); false when `limit` passed first.
+  // start); false when `limit` passed first. WaitForResets and
+  // WaitForAnswers come with the counters.
   bool WaitForProcessed(std::size_t bytes, std::chrono::milliseconds limit) const;
   bool WaitForExecutes(std::size_t count, std::chrono::milliseconds limit) const;
-  bool WaitForResets(std::size_t count, std::chrono::milliseconds limit) const;
-  bool WaitForAnswers(std::size_t count, std::chrono::milliseconds limit) const;
 
  private:
   using Clock = std::chrono::steady_clock;
@@ -157,8 +152,6 @@ class KR40Simulator {
   void Reset();
   void AnswerPoint(Clock::time_point received);
   bool Present(std::uint32_t address) const;
-  bool WaitFor(const std::function<bool(const KR40Counters&)>& reached,
-               std::chrono::milliseconds limit) const;
 
   const KR40Protocol protocol_;
   const bool timing_;
@@ -166,8 +159,6 @@ class KR40Simulator {
   std::unique_ptr<PseudoTerminal> pty_;
   int slaveFd_ = -1;  // held open so that the master never sees a hang-up between users
   int wakeFd_ = -1;
-  std::thread thread_;
-  bool running_ = false;
 
   // Owned by the simulator thread.
   std::deque<Timed> input_;   // bytes read, waiting for their time on the line
@@ -175,13 +166,11 @@ class KR40Simulator {
   Clock::time_point lineFreeIn_{};
   Clock::time_point lineFreeOut_{};
 
-  mutable std::mutex mutex_;
-  mutable std::condition_variable changed_;
+  // Guarded by mutex_, with the counters.
   std::set<std::uint32_t> modules_;
   bool allModules_ = false;
   KR40Fault fault_;
   std::uint64_t answersSinceFault_ = 0;
-  KR40Counters counters_;
   KR40RelayStates relays_;
   KR40RelayStates staged_;  // switched at the next execute
   Expect expect_ = Expect::kAny;

@@ -5,7 +5,7 @@
 
 #include <algorithm>
 #include <set>
-#include <system_error>
+#include <thread>
 
 #include "config/QFCFSHelper.h"
 #include "config/QFCKR60HardwareInfo.h"
@@ -236,13 +236,10 @@ bool KR60Simulator::Open(std::string* error) {
     Close();
     return Fail(error, text);
   }
-  try {
-    thread_ = std::thread([this] { Run(); });
-  } catch (const std::system_error& e) {
+  if (!StartThread([this] { Run(); }, error)) {
     Close();
-    return Fail(error, std::string("thread: ") + e.what());
+    return false;
   }
-  running_ = true;
   return true;
 }
 
@@ -260,15 +257,13 @@ KR60Simulator::~KR60Simulator() {
 }
 
 void KR60Simulator::Stop() {
-  if (running_) {
+  StopThread([this] {
     {
       std::lock_guard<std::mutex> lock(mutex_);
       stopping_ = true;
     }
     event_->Set();
-    thread_.join();
-    running_ = false;
-  }
+  });
   Close();
 }
 
@@ -317,7 +312,7 @@ void KR60Simulator::Run() {
       tally_ = {};
       next = NextDue();
     }
-    changed_.notify_all();
+    NotifyCountersChanged();
     for (const KR60Event& event : events) onEvent_(event);
 
     // The receive event wakes the thread for new frames and for Stop();
@@ -636,11 +631,6 @@ int KR60Simulator::FiuRelayBit(std::uint32_t position) {
   return position < 5 || position > 42 ? -1 : static_cast<int>(position - 5);
 }
 
-KR60Counters KR60Simulator::Counters() const {
-  std::lock_guard<std::mutex> lock(mutex_);
-  return counters_;
-}
-
 std::vector<CanFrameRecord> KR60Simulator::ReceivedFrames() const {
   std::lock_guard<std::mutex> lock(mutex_);
   return {received_.begin(), received_.end()};
@@ -668,26 +658,12 @@ bool KR60Simulator::SetFaultMode(KR60ModuleId id, const KR60Fault& fault) {
   return true;
 }
 
-bool KR60Simulator::WaitFor(const std::function<bool(const KR60Counters&)>& reached,
-                            std::chrono::milliseconds limit) const {
-  std::unique_lock<std::mutex> lock(mutex_);
-  return changed_.wait_for(lock, limit, [&] { return reached(counters_); });
-}
-
 bool KR60Simulator::WaitForFrames(std::uint64_t count, std::chrono::milliseconds limit) const {
-  return WaitFor([count](const KR60Counters& c) { return c.frames >= count; }, limit);
+  return WaitFor(&KR60Counters::frames, count, limit);
 }
 
 bool KR60Simulator::WaitForCommits(std::uint64_t count, std::chrono::milliseconds limit) const {
-  return WaitFor([count](const KR60Counters& c) { return c.commits >= count; }, limit);
-}
-
-bool KR60Simulator::WaitForResets(std::uint64_t count, std::chrono::milliseconds limit) const {
-  return WaitFor([count](const KR60Counters& c) { return c.resets >= count; }, limit);
-}
-
-bool KR60Simulator::WaitForAnswers(std::uint64_t count, std::chrono::milliseconds limit) const {
-  return WaitFor([count](const KR60Counters& c) { return c.answers >= count; }, limit);
+  return WaitFor(&KR60Counters::commits, count, limit);
 }
 
 }  // namespace faultbox::sim

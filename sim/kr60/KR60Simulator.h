@@ -7,7 +7,6 @@
 
 #include <chrono>
 #include <compare>
-#include <condition_variable>
 #include <cstdint>
 #include <deque>
 #include <functional>
@@ -16,9 +15,9 @@
 #include <mutex>
 #include <optional>
 #include <string>
-#include <thread>
 #include <vector>
 
+#include "SimulatorThread.h"
 #include "platform/CanAccess.h"
 
 namespace faultbox::sim {
@@ -101,7 +100,7 @@ struct KR60SimulatorOptions {
   std::function<void(const KR60Event&)> onEvent;
 };
 
-class KR60Simulator {
+class KR60Simulator : public SimulatorThread<KR60Counters> {
  public:
   // In a relay vector a bit of 0 is a relay that is on, 1 one that is off.
   static constexpr std::uint64_t kAllOff = ~std::uint64_t{0};
@@ -114,8 +113,6 @@ class KR60Simulator {
   static std::unique_ptr<KR60Simulator> Start(const KR60SimulatorOptions& options,
                                               std::string* error = nullptr);
   ~KR60Simulator();
-  KR60Simulator(const KR60Simulator&) = delete;
-  KR60Simulator& operator=(const KR60Simulator&) = delete;
 
   // Leaves the bus; answers not yet sent are dropped. Safe to call twice.
   void Stop();
@@ -141,7 +138,6 @@ class KR60Simulator {
   // The bit of relay position 5..42 of a failure class in the FIU vector; -1 outside.
   static int FiuRelayBit(std::uint32_t position);
 
-  KR60Counters Counters() const;
   // Every frame taken off the bus (the last kLogLimit), and every answer sent.
   std::vector<CanFrameRecord> ReceivedFrames() const;
   std::vector<CanFrameRecord> SentFrames() const;
@@ -154,10 +150,9 @@ class KR60Simulator {
   // start); false when `limit` passed first. A frame is counted once the
   // answers it gets at once are on the bus (not the late ones, nor, with
   // timing on, those still waiting for the bus); its relays switch before.
+  // WaitForResets and WaitForAnswers come with the counters.
   bool WaitForFrames(std::uint64_t count, std::chrono::milliseconds limit) const;
   bool WaitForCommits(std::uint64_t count, std::chrono::milliseconds limit) const;
-  bool WaitForResets(std::uint64_t count, std::chrono::milliseconds limit) const;
-  bool WaitForAnswers(std::uint64_t count, std::chrono::milliseconds limit) const;
 
   // The bits a frame occupies on the bus: start of frame to intermission,
   // stuff bits included; and the time that takes at kBitRate.
@@ -193,8 +188,6 @@ class KR60Simulator {
   void Answer(KR60ModuleId id, const Module& module, KR60FaultMode mode, const CanFrameRecord& request,
               std::uint8_t status, Clock::time_point at);
   void Note(std::deque<CanFrameRecord>& log, const CanFrameRecord& frame);
-  bool WaitFor(const std::function<bool(const KR60Counters&)>& reached,
-               std::chrono::milliseconds limit) const;
 
   const std::string target_;
   const std::uint32_t offset_;
@@ -202,14 +195,10 @@ class KR60Simulator {
   const std::function<void(const KR60Event&)> onEvent_;
   CanHandle handle_ = 0;
   std::shared_ptr<NamedEvent> event_;
-  std::thread thread_;
-  bool running_ = false;
 
-  mutable std::mutex mutex_;
-  mutable std::condition_variable changed_;
+  // Guarded by mutex_, with the counters.
   bool stopping_ = false;
   std::map<KR60ModuleId, Module> modules_;
-  KR60Counters counters_;
   KR60Counters tally_;  // of the frames decoded, counted into counters_ once their answers are out
   std::uint64_t sequence_ = 0;
   // The bus model: frames the host put on the bus, waiting for the bus; frames

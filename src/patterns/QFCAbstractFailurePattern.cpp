@@ -290,20 +290,33 @@ void QFCAbstractFailurePattern::ResetHardwareAfterFailure() {
   }
 }
 
+HRESULT QFCAbstractFailurePattern::InternalFault(int place) {
+  TheApp().ReportInternalFault(place);
+  return E_FAULTBOX_NULL_POINTER;
+}
+
+QFCAbstractTransferInterface* QFCAbstractFailurePattern::ConnectedTransferInterface(int placeMissing,
+                                                                                    HRESULT& result) const {
+  QFCAbstractTransferInterface* transfer = system_ ? system_->GetTransferInterface() : nullptr;
+  if (transfer == nullptr) {
+    result = InternalFault(placeMissing);
+    return nullptr;
+  }
+  if (!transfer->IsConnected()) {
+    TheApp().ReportError(kMsgNotConnected);
+    result = E_FAULTBOX_NOT_CONNECTED_TO_HARDWARE;
+    return nullptr;
+  }
+  return transfer;
+}
+
 HRESULT QFCAbstractFailurePattern::ActivatePattern(bool activate) {
   TheApp().ReportInfo(activate ? kMsgActivating : kMsgDeactivating, GetName());
   // Nothing is on the hardware: nothing to send, connected or not.
   if (!activate && !IsAnyPinActivated()) return FAULTBOX_OK;
 
-  QFCAbstractTransferInterface* transfer = system_ ? system_->GetTransferInterface() : nullptr;
-  if (transfer == nullptr) {
-    TheApp().ReportInternalFault(kPlaceNoTransferInterface);
-    return E_FAULTBOX_NULL_POINTER;
-  }
-  if (!transfer->IsConnected()) {
-    TheApp().ReportError(kMsgNotConnected);
-    return E_FAULTBOX_NOT_CONNECTED_TO_HARDWARE;
-  }
+  HRESULT result = FAULTBOX_OK;
+  if (ConnectedTransferInterface(kPlaceNoTransferInterface, result) == nullptr) return result;
   // At most one pattern of a system holds activated pins.
   QFCAbstractFailurePattern* active = nullptr;
   if (collection_ && collection_->GetActivatedPattern(active) && active != this) {
@@ -322,7 +335,6 @@ HRESULT QFCAbstractFailurePattern::ActivatePattern(bool activate) {
     if (pin->IsSelected() && !pin->IsReadyForActivation()) pin->SetSelected(false);
 
   QFCMessageList messages;
-  HRESULT result = FAULTBOX_OK;
   if (!BuildMessages(messages, activate)) {
     TheApp().ReportError(kMsgBuildFailed);
     result = E_FAULTBOX_MESSAGE_BUILD;

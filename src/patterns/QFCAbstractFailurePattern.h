@@ -10,6 +10,7 @@
 #include <string_view>
 #include <vector>
 
+#include "comm/QFCAbstractTransferInterface.h"
 #include "config/QFCAbstractObjectData.h"
 #include "host/ResultCodes.h"
 #include "patterns/QFCAbstractMessage.h"
@@ -133,6 +134,24 @@ class QFCAbstractFailurePattern : public QFCAbstractObjectData {
                                   std::int32_t relayVectorIndex, std::uint64_t& mask);
   // After a failed transfer: the system's hardware reset, so that no relay stays switched.
   void ResetHardwareAfterFailure();
+  // The system's transfer interface once it is connected; else nullptr with
+  // the failure reported and its code in `result`: an internal fault at
+  // `placeMissing` when the system has none, message 120 when it is not
+  // connected.
+  QFCAbstractTransferInterface* ConnectedTransferInterface(int placeMissing, HRESULT& result) const;
+  // The same as the platform's own kind of interface; one of another kind is
+  // an internal fault at `placeWrongKind`.
+  template <class Interface>
+  Interface* ConnectedTransferInterface(int placeMissing, int placeWrongKind, HRESULT& result) const {
+    QFCAbstractTransferInterface* transfer = ConnectedTransferInterface(placeMissing, result);
+    if (transfer == nullptr) return nullptr;
+    auto* own = dynamic_cast<Interface*>(transfer);
+    if (own == nullptr) result = InternalFault(placeWrongKind);
+    return own;
+  }
+  // An internal fault at `place`, for a part that is missing or not of the
+  // kind it should be; gives E_FAULTBOX_NULL_POINTER.
+  static HRESULT InternalFault(int place);
 
   std::unique_ptr<QFCFailurePatternPins> pins_;
   std::unique_ptr<QFCAbstractFailurePatternSafetyInterlock> interlock_;

@@ -5,6 +5,7 @@
 #include "host/QFCFaultboxApp.h"
 #include "patterns/QFCAbstractFailurePattern.h"
 #include "patterns/QFCAbstractFailurePatternPin.h"
+#include "patterns/QFCFailurePatternPins.h"
 
 namespace faultbox {
 
@@ -75,6 +76,45 @@ bool QFCAbstractFailurePatternSafetyInterlock::AdjustPinConfig(
         config[k] = QFCAbstractFailurePatternPin::kEntryOff;
   }
   pin->SetPinConfigs(config);
+  return true;
+}
+
+bool QFCAbstractFailurePatternSafetyInterlock::CheckPinWith(QFCAbstractFailurePatternPin* pin,
+                                                            const QFCAbstractFailureClasses* classes,
+                                                            std::vector<std::uint32_t>* requirement) {
+  return CheckPinSkeleton(pin, classes, requirement);
+}
+
+const QFCAbstractFailureClasses* QFCAbstractFailurePatternSafetyInterlock::BeginFullCheck(int placeNoPattern,
+                                                                                          int placeNoClasses,
+                                                                                          bool& result) {
+  result = false;
+  QFCAbstractFailurePattern* pattern = GetPattern();
+  if (pattern == nullptr) {
+    TheApp().ReportInternalFault(placeNoPattern);
+    return nullptr;
+  }
+  result = true;
+  if (!pattern->IsInterlockEnabled()) return nullptr;
+  const QFCAbstractFailureClasses* classes = pattern->GetFailureClasses();
+  if (classes == nullptr) {
+    TheApp().ReportInternalFault(placeNoClasses);
+    result = false;
+  }
+  return classes;
+}
+
+bool QFCAbstractFailurePatternSafetyInterlock::CheckEveryPin(const QFCAbstractFailureClasses* classes,
+                                                             std::vector<std::uint32_t>* requirement,
+                                                             bool explicitFirst) {
+  QFCFailurePatternPins* pins = GetPattern()->GetPins();
+  if (pins == nullptr) return true;
+  FullCheckScope scope(*this);
+  if (explicitFirst)
+    for (const auto& pin : pins->GetList())
+      if (pin->IsExplicitChoice() && !CheckPinWith(pin.get(), classes, requirement)) return false;
+  for (const auto& pin : pins->GetList())
+    if (!CheckPinWith(pin.get(), classes, requirement)) return false;
   return true;
 }
 

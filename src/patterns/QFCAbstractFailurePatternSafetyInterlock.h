@@ -29,8 +29,9 @@ class QFCAbstractFailurePatternSafetyInterlock {
   virtual QFCAbstractFailurePattern* GetPattern() const = 0;
   // Derives the pin's failure class. `classes` and `requirement` may be
   // nullptr: the system's classes and a requirement vector of the pin's own.
+  // The platforms' part is in the hooks below.
   virtual bool CheckPinWith(QFCAbstractFailurePatternPin* pin, const QFCAbstractFailureClasses* classes,
-                            std::vector<std::uint32_t>* requirement) = 0;
+                            std::vector<std::uint32_t>* requirement);
   // Every (class, relay vector) of the classes the pin defines, in pin file
   // order, that does not need off an entry the user switched on.
   virtual void GetPossibleFailureClasses(const QFCAbstractFailurePatternPin* pin,
@@ -56,6 +57,18 @@ class QFCAbstractFailurePatternSafetyInterlock {
   // The twelve steps of one pin's check, with the platform's part above.
   bool CheckPinSkeleton(QFCAbstractFailurePatternPin* pin, const QFCAbstractFailureClasses* classes,
                         std::vector<std::uint32_t>* requirement);
+
+  // The start of a full check: the system's failure classes to check
+  // against, or nullptr when the check ends before it began, with its
+  // result in `result`: false without a pattern or without failure classes
+  // (an internal fault at `placeNoPattern` or `placeNoClasses`), true while
+  // the pattern's interlock is switched off.
+  const QFCAbstractFailureClasses* BeginFullCheck(int placeNoPattern, int placeNoClasses, bool& result);
+  // Checks the pattern's pins in pattern order as one full check; with
+  // `explicitFirst` the pins whose class is being chosen explicitly go once
+  // before all. The first pin that fails ends it.
+  bool CheckEveryPin(const QFCAbstractFailureClasses* classes, std::vector<std::uint32_t>* requirement,
+                     bool explicitFirst);
 
   // A full check marks the document modified once, not once per pin: asking
   // whether the document is read-only asks the file system.

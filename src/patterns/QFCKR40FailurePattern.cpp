@@ -17,7 +17,6 @@ namespace faultbox {
 namespace {
 
 constexpr int kMsgTimeOut = 69;
-constexpr int kMsgNotConnected = 120;
 constexpr int kMsgNotAnswered = 174;
 
 constexpr int kPlaceNoBuilder = 6611;
@@ -54,33 +53,18 @@ bool QFCKR40FailurePattern::BuildMessages(QFCMessageList& messages, bool activat
 }
 
 HRESULT QFCKR40FailurePattern::TransferMessages(QFCMessageList& messages, bool) {
-  QFCSystem* system = GetOwnerSystem();
-  QFCAbstractTransferInterface* transfer = system ? system->GetTransferInterface() : nullptr;
-  if (transfer == nullptr) {
-    TheApp().ReportInternalFault(kPlaceNoTransferInterface);
-    return E_FAULTBOX_NULL_POINTER;
-  }
-  if (!transfer->IsConnected()) {
-    TheApp().ReportError(kMsgNotConnected);
-    return E_FAULTBOX_NOT_CONNECTED_TO_HARDWARE;
-  }
-  auto* serial = dynamic_cast<QFCSerielleTransferInterface*>(transfer);
-  if (serial == nullptr) {
-    TheApp().ReportInternalFault(kPlaceNotSerial);
-    return E_FAULTBOX_NULL_POINTER;
-  }
+  HRESULT result = FAULTBOX_OK;
+  auto* serial = ConnectedTransferInterface<QFCSerielleTransferInterface>(kPlaceNoTransferInterface,
+                                                                          kPlaceNotSerial, result);
+  if (serial == nullptr) return result;
   // A byte left over from before would be taken for an answer.
   serial->FlushReceiveQueue();
 
   // The bytes sent since the last answer: an answer is their checksum.
   QFCSerielleMessageMap unanswered;
-  HRESULT result = FAULTBOX_OK;
   for (std::size_t i = 0; i < messages.size(); ++i) {
     const auto* message = dynamic_cast<const QFCSerielleMessage*>(messages[i].get());
-    if (message == nullptr) {
-      TheApp().ReportInternalFault(kPlaceNotSerialMessage);
-      return E_FAULTBOX_NULL_POINTER;
-    }
+    if (message == nullptr) return InternalFault(kPlaceNotSerialMessage);
     if ((result = serial->SendByte(message)) != FAULTBOX_OK) return result;
     unanswered[static_cast<std::int32_t>(i)] = message;
     if (!message->ExpectsAnswer()) continue;

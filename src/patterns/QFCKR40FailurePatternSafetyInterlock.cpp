@@ -5,7 +5,6 @@
 #include <algorithm>
 
 #include "host/QFCFaultboxApp.h"
-#include "patterns/QFCFailurePatternPins.h"
 #include "patterns/QFCKR40FailurePattern.h"
 #include "patterns/QFCKR40FailurePatternPin.h"
 #include "systems/QFCSystem.h"
@@ -44,33 +43,15 @@ void QFCKR40FailurePatternSafetyInterlock::FilterCandidates(
                    candidates.end());
 }
 
-bool QFCKR40FailurePatternSafetyInterlock::CheckPinWith(QFCAbstractFailurePatternPin* pin,
-                                                        const QFCAbstractFailureClasses* classes,
-                                                        std::vector<std::uint32_t>* requirement) {
-  return CheckPinSkeleton(pin, classes, requirement);
-}
-
 bool QFCKR40FailurePatternSafetyInterlock::CheckPin(QFCAbstractFailurePatternPin* pin) {
   return CheckPinWith(pin, nullptr, nullptr);
 }
 
 bool QFCKR40FailurePatternSafetyInterlock::CheckAll() {
-  if (pattern_ == nullptr) {
-    TheApp().ReportInternalFault(kPlaceCheckAllNoPattern);
-    return false;
-  }
-  if (!pattern_->IsInterlockEnabled()) return true;
-  const QFCAbstractFailureClasses* classes = pattern_->GetFailureClasses();
-  if (classes == nullptr) {
-    TheApp().ReportInternalFault(kPlaceCheckAllNoClasses);
-    return false;
-  }
-  QFCFailurePatternPins* pins = pattern_->GetPins();
-  if (pins == nullptr) return true;
-  FullCheckScope scope(*this);
-  for (const auto& pin : pins->GetList())
-    if (!CheckPinWith(pin.get(), classes, nullptr)) return false;
-  return true;
+  bool result = false;
+  const QFCAbstractFailureClasses* classes =
+      BeginFullCheck(kPlaceCheckAllNoPattern, kPlaceCheckAllNoClasses, result);
+  return classes ? CheckEveryPin(classes, nullptr, false) : result;
 }
 
 }  // namespace faultbox

@@ -15,8 +15,6 @@ class QFCKR40FailurePatternSafetyInterlock : public QFCAbstractFailurePatternSaf
   bool CheckPin(QFCAbstractFailurePatternPin* pin) override;
   bool CheckAll() override;
   QFCAbstractFailurePattern* GetPattern() const override;
-  bool CheckPinWith(QFCAbstractFailurePatternPin* pin, const QFCAbstractFailureClasses* classes,
-                    std::vector<std::uint32_t>* requirement) override;
 
  protected:
   bool IsPlatformPin(const QFCAbstractFailurePatternPin* pin) const override;

@@ -6,7 +6,6 @@
 #include <array>
 
 #include "host/QFCFaultboxApp.h"
-#include "patterns/QFCFailurePatternPins.h"
 #include "patterns/QFCKR60FailurePattern.h"
 #include "patterns/QFCKR60FailurePatternPin.h"
 
@@ -73,43 +72,24 @@ bool QFCKR60FailurePatternSafetyInterlock::IsRefusedByPlatformRule(
   return false;
 }
 
-bool QFCKR60FailurePatternSafetyInterlock::CheckPinWith(QFCAbstractFailurePatternPin* pin,
-                                                        const QFCAbstractFailureClasses* classes,
-                                                        std::vector<std::uint32_t>* requirement) {
-  return CheckPinSkeleton(pin, classes, requirement);
-}
-
 bool QFCKR60FailurePatternSafetyInterlock::CheckPin(QFCAbstractFailurePatternPin* pin) {
   if (QFCAbstractFailurePattern::IsServiceMode()) return CheckPinWith(pin, nullptr, nullptr);
   return CheckAll();
 }
 
 bool QFCKR60FailurePatternSafetyInterlock::CheckAll() {
-  if (pattern_ == nullptr) {
-    TheApp().ReportInternalFault(kPlaceCheckAllNoPattern);
-    return false;
-  }
-  if (!pattern_->IsInterlockEnabled()) return true;
-  const QFCAbstractFailureClasses* classes = pattern_->GetFailureClasses();
-  if (classes == nullptr) {
-    TheApp().ReportInternalFault(kPlaceCheckAllNoClasses);
-    return false;
-  }
+  bool result = false;
+  const QFCAbstractFailureClasses* classes =
+      BeginFullCheck(kPlaceCheckAllNoPattern, kPlaceCheckAllNoClasses, result);
+  if (classes == nullptr) return result;
   requirement_.assign(kRequirementPositions, 0);
   if (!pattern_->BuildExternalRequirement(requirement_)) {
     TheApp().ReportInternalFault(kPlaceCheckAllExternal);
     return false;
   }
-  QFCFailurePatternPins* pins = pattern_->GetPins();
-  if (pins == nullptr) return true;
-  FullCheckScope scope(*this);
   // A pin whose class is being chosen explicitly takes it before any other
   // pin is judged against it.
-  for (const auto& pin : pins->GetList())
-    if (pin->IsExplicitChoice() && !CheckPinWith(pin.get(), classes, &requirement_)) return false;
-  for (const auto& pin : pins->GetList())
-    if (!CheckPinWith(pin.get(), classes, &requirement_)) return false;
-  return true;
+  return CheckEveryPin(classes, &requirement_, true);
 }
 
 }  // namespace faultbox

@@ -23,8 +23,6 @@ class QFCKR60FailurePatternSafetyInterlock : public QFCAbstractFailurePatternSaf
   // explicitly first, then all pins in pattern order.
   bool CheckAll() override;
   QFCAbstractFailurePattern* GetPattern() const override;
-  bool CheckPinWith(QFCAbstractFailurePatternPin* pin, const QFCAbstractFailureClasses* classes,
-                    std::vector<std::uint32_t>* requirement) override;
 
   // The failure class text of a pin the exclusive-entry rule refused.
   const std::string& GetMessageText() const { return messageText_; }

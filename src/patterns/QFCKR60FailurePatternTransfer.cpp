@@ -8,14 +8,12 @@
 #include "comm/QFCCANTransferInterface.h"
 #include "host/QFCFaultboxApp.h"
 #include "patterns/QFCKR60FailurePattern.h"
-#include "systems/QFCSystem.h"
 
 namespace faultbox {
 
 namespace {
 
 constexpr int kMsgTimeOut = 69;
-constexpr int kMsgNotConnected = 120;
 
 constexpr int kPlaceNoTransferInterface = 6711;
 constexpr int kPlaceNotCAN = 6712;
@@ -34,21 +32,10 @@ HRESULT Await(QFCCANTransferInterface& can, const QFCCANExpectedMap& expected) {
 }  // namespace
 
 HRESULT QFCKR60FailurePattern::TransferMessages(QFCMessageList& messages, bool activate) {
-  QFCSystem* system = GetOwnerSystem();
-  QFCAbstractTransferInterface* transfer = system ? system->GetTransferInterface() : nullptr;
-  if (transfer == nullptr) {
-    TheApp().ReportInternalFault(kPlaceNoTransferInterface);
-    return E_FAULTBOX_NULL_POINTER;
-  }
-  if (!transfer->IsConnected()) {
-    TheApp().ReportError(kMsgNotConnected);
-    return E_FAULTBOX_NOT_CONNECTED_TO_HARDWARE;
-  }
-  auto* can = dynamic_cast<QFCCANTransferInterface*>(transfer);
-  if (can == nullptr) {
-    TheApp().ReportInternalFault(kPlaceNotCAN);
-    return E_FAULTBOX_NULL_POINTER;
-  }
+  HRESULT opened = FAULTBOX_OK;
+  auto* can =
+      ConnectedTransferInterface<QFCCANTransferInterface>(kPlaceNoTransferInterface, kPlaceNotCAN, opened);
+  if (can == nullptr) return opened;
 
   // Checked before anything is sent: a list that breaks off half-way would
   // leave modules loaded without their commit.
@@ -56,14 +43,9 @@ HRESULT QFCKR60FailurePattern::TransferMessages(QFCMessageList& messages, bool a
   std::set<std::int32_t> steps;
   for (const auto& message : messages) {
     const auto* frame = dynamic_cast<const QFCCANMessage*>(message.get());
-    if (frame == nullptr) {
-      TheApp().ReportInternalFault(kPlaceNotCANMessage);
-      return E_FAULTBOX_NULL_POINTER;
-    }
-    if (frame->GetModuleType() < kModuleFIU || frame->GetModuleType() > kModuleRSIM) {
-      TheApp().ReportInternalFault(kPlaceModuleType);
-      return E_FAULTBOX_NULL_POINTER;
-    }
+    if (frame == nullptr) return InternalFault(kPlaceNotCANMessage);
+    if (frame->GetModuleType() < kModuleFIU || frame->GetModuleType() > kModuleRSIM)
+      return InternalFault(kPlaceModuleType);
     frames.push_back(frame);
     steps.insert(frame->GetStep());
   }

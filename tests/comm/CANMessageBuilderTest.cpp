@@ -16,14 +16,12 @@
 #include "comm/QFCCANMessage.h"
 #include "comm/QFCCANMessageBuilder.h"
 #include "config/QFCAbstractFailureClasses.h"
-#include "config/QFCECU.h"
+#include "patterns/KR60PatternBench.h"
 #include "patterns/QFCAbstractFailurePatternPin.h"
 #include "patterns/QFCFailurePatternPins.h"
-#include "patterns/QFCFailurePatterns.h"
 #include "patterns/QFCKR60FailurePattern.h"
 #include "support/MessageCapture.h"
 #include "systems/QFCSystem.h"
-#include "systems/SystemTestBench.h"
 
 namespace faultbox::test {
 namespace {
@@ -109,21 +107,18 @@ QFTPossibility Relays(std::initializer_list<Relay> relays) {
 class CANBuilderTest : public ::testing::Test {
  protected:
   void Open(const char* rsim = "0_0_4", const char* fiu = "0_0_3", const char* offset = "10") {
-    PinFile file = PinFile::KR60();
-    file.Set("OffsetLoadAddress", offset).Set("FIULoadAddress", fiu).Set("RSIMLoadAddress", rsim);
-    file.pins = {"P1;Engine;1;1;0_1_2;3", "P2;Engine;1;1;0_1_2;4", "P3;Gearbox;1;2;0_1_3;0,7"};
-    system_ = std::make_unique<QFCSystem>("CAN", bench_.Write("can.csv", file), 1, "Tester", "Rig");
-    ASSERT_EQ(system_->OpenFromPinFile(), FAULTBOX_OK);
-    system_->GetFailureClasses()->RemoveAll();
+    builder_.reset();
+    bench_.reset();
+    bench_ = std::make_unique<KR60Bench>(
+        std::vector<KR60PinLine>{{"P1", "Engine", "1", "0_1_2", "3"},
+                                 {"P2", "Engine", "1", "0_1_2", "4"},
+                                 {"P3", "Gearbox", "1", "0_1_3", "0,7"}},
+        std::vector<std::pair<std::string, std::string>>{
+            {"OffsetLoadAddress", offset}, {"FIULoadAddress", fiu}, {"RSIMLoadAddress", rsim}});
+    system_ = bench_->system();
     system_->GetRespondingModules() = {0x012, 0x013, 0x003, 0x004};
-    QFCAbstractFailurePattern* created = nullptr;
-    ASSERT_EQ(system_->GetFailurePatterns()->CreatePattern(created, "Pattern"), FAULTBOX_OK);
-    pattern_ = dynamic_cast<QFCKR60FailurePattern*>(created);
+    pattern_ = bench_->CreateWith(bench_->AllPins(), "Pattern");
     ASSERT_NE(pattern_, nullptr);
-    std::vector<QFCAbstractPin*> pins;
-    for (QFCECU* ecu : system_->GetECUs())
-      for (int i = 0; i < ecu->GetPinCount(); ++i) pins.push_back(ecu->GetPin(i));
-    ASSERT_TRUE(pattern_->AddPins(pins));
   }
   void SetUp() override { Open(); }
 
@@ -155,8 +150,8 @@ class CANBuilderTest : public ::testing::Test {
   }
 
   MessageCapture messages_;
-  Bench bench_;
-  std::unique_ptr<QFCSystem> system_;
+  std::unique_ptr<KR60Bench> bench_;
+  QFCSystem* system_ = nullptr;
   QFCKR60FailurePattern* pattern_ = nullptr;
   std::unique_ptr<QFCCANMessageBuilder> builder_;
   std::int32_t lastId_ = 0;

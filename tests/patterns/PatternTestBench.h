@@ -1,13 +1,16 @@
-// A KR40-family system opened from a pin file written by the test, with
-// failure classes made in memory, its pattern collection and root folder,
-// and stand-ins for the hardware: a transfer interface that connects at
-// once and patterns whose message building and sending are scripted.
+// A system opened from a pin file written by the test, with failure classes
+// made in memory, a pattern collection and root folder of its own; and for
+// the KR40 family stand-ins for the hardware: a transfer interface that
+// connects at once and patterns whose message building and sending are
+// scripted.
 #pragma once
 
 #include <gtest/gtest.h>
 
 #include <memory>
 #include <string>
+#include <type_traits>
+#include <utility>
 #include <vector>
 
 #include "comm/QFCAbstractTransferInterface.h"
@@ -18,6 +21,7 @@
 #include "patterns/QFCFailurePatternPins.h"
 #include "patterns/QFCFailurePatterns.h"
 #include "patterns/QFCKR40FailurePattern.h"
+#include "platform/Archive.h"
 #include "support/MessageCapture.h"
 #include "systems/QFCSystem.h"
 #include "systems/SystemTestBench.h"
@@ -88,33 +92,36 @@ struct PinLine {
   std::string channel = "1";
 };
 
-// A relay vector given as the states of positions 0 to 4 ("21100"); the
-// positions of the external hardware are off.
-inline QFTPossibility Vector(const std::string& states) {
-  QFTPossibility p(kRelayPositions, kRelayOff);
+// A relay vector of 43 positions: `states` gives the first positions
+// ("21100"), `on` further positions that must be on, everything else `rest`
+// (off unless said: the positions of the external hardware).
+inline QFTPossibility Vector(const std::string& states, const std::vector<std::size_t>& on = {},
+                             std::uint32_t rest = kRelayOff) {
+  QFTPossibility p(kRelayPositions, rest);
   for (std::size_t k = 0; k < states.size(); ++k) p.Set(k, static_cast<std::uint32_t>(states[k] - '0'), 0, 0);
+  for (std::size_t k : on) p.Set(k, kRelayOn, 0, 0);
   return p;
 }
 
-class PatternBench {
+// What every pattern bench has: a system opened from the pin file `file`
+// written as `fileName`, its failure classes emptied, and a fresh collection
+// of `Patterns` whose patterns are `Pattern`s.
+template <class Patterns, class Pattern>
+class SystemPatternBench {
  public:
-  explicit PatternBench(const std::vector<PinLine>& lines, const std::string& board = "KR40") {
-    PinFile file = PinFile::KR40(board);
-    file.pins.clear();
-    for (const auto& l : lines)
-      file.pins.push_back(l.pin + ";" + l.ecu + ";" + l.classes + ";" + l.module + ";" + l.channel);
-    path_ = bench_.Write("bench.csv", file);
-    system_ = std::make_unique<QFCSystem>("Bench", path_, 1, "Tester", "Rig");
+  SystemPatternBench(const std::string& fileName, const PinFile& file, const std::string& systemName) {
+    path_ = bench_.Write(fileName, file);
+    system_ = std::make_unique<QFCSystem>(systemName, path_, 1, "Tester", "Rig");
     const HRESULT opened = system_->OpenFromPinFile();
     EXPECT_EQ(opened, FAULTBOX_OK);
     classes()->RemoveAll();
     MakeCollection();
   }
-  ~PatternBench() { DropCollection(); }
+  ~SystemPatternBench() { DropCollection(); }
 
   QFCSystem* system() const { return system_.get(); }
   QFCAbstractFailureClasses* classes() const { return system_->GetFailureClasses(); }
-  ScriptedPatterns& patterns() { return *patterns_; }
+  Patterns& patterns() { return *patterns_; }
   QFCFailurePatternNode& root() { return *root_; }
   const std::string& pinFilePath() const { return path_; }
   const Bench& files() const { return bench_; }
@@ -122,7 +129,7 @@ class PatternBench {
   // A fresh, empty collection and root folder, as a freshly opened system has.
   void MakeCollection() {
     DropCollection();
-    patterns_ = std::make_unique<ScriptedPatterns>(system_.get());
+    patterns_ = std::make_unique<Patterns>(system_.get());
     root_ = std::make_unique<QFCFailurePatternNode>(system_.get(), patterns_.get());
     patterns_->SetRootFolder(root_.get());
   }
@@ -131,13 +138,13 @@ class PatternBench {
     patterns_.reset();
   }
 
-  QFCAbstractFailureClass& AddClass(std::int32_t id, const std::vector<std::string>& vectors,
+  QFCAbstractFailureClass& AddClass(std::int32_t id, std::vector<QFTPossibility> vectors,
                                     std::int32_t limit = 0) {
     QFCAbstractFailureClass& fc = classes()->AddFailureClass();
     fc.SetId(id);
     fc.SetName("Class " + std::to_string(id));
     fc.SetUseLimit(limit);
-    for (const auto& v : vectors) fc.AddPossibility(Vector(v));
+    for (auto& v : vectors) fc.AddPossibility(std::move(v));
     return fc;
   }
 
@@ -148,6 +155,7 @@ class PatternBench {
     ADD_FAILURE() << "no pin " << ecu << "/" << pin;
     return nullptr;
   }
+  // Every pin of the system, in pin file order.
   std::vector<QFCAbstractPin*> AllPins() const {
     std::vector<QFCAbstractPin*> out;
     for (QFCECU* e : system_->GetECUs())
@@ -155,33 +163,77 @@ class PatternBench {
     return out;
   }
 
-  QFCAbstractFailurePattern* Create(const std::string& name = "") {
+  Pattern* Create(const std::string& name = "") {
     QFCAbstractFailurePattern* pattern = nullptr;
     EXPECT_EQ(patterns_->CreatePattern(pattern, name), FAULTBOX_OK);
-    return pattern;
+    if constexpr (std::is_same_v<Pattern, QFCAbstractFailurePattern>) {
+      return pattern;
+    } else {
+      auto* own = dynamic_cast<Pattern*>(pattern);
+      EXPECT_NE(own, nullptr);
+      return own;
+    }
   }
   // A pattern holding the pins, in the order given.
-  QFCAbstractFailurePattern* CreateWith(const std::vector<QFCAbstractPin*>& pins,
-                                        const std::string& name = "") {
-    QFCAbstractFailurePattern* pattern = Create(name);
+  Pattern* CreateWith(const std::vector<QFCAbstractPin*>& pins, const std::string& name = "") {
+    Pattern* pattern = Create(name);
     EXPECT_TRUE(pattern->AddPins(pins));
     return pattern;
   }
 
-  // Connects a stand-in transfer interface and lets every module answer.
-  void Connect() {
-    system_->AddTransferInterface(std::make_unique<TestTransferInterface>(system_.get()));
-    system_->GetTransferInterface()->Connect(true, 0, 0);
-    for (QFCAbstractPin* p : AllPins())
-      system_->GetRespondingModules().insert(static_cast<std::uint16_t>(p->GetModuleAddress()));
+  std::vector<std::uint8_t> Save() {
+    Archive ar;
+    patterns_->Serialize(ar);
+    return ar.Data();
+  }
+  // Into a fresh collection, as a freshly opened system has.
+  void Load(const std::vector<std::uint8_t>& bytes) {
+    DropCollection();
+    classes()->ResetAllUses();
+    MakeCollection();
+    Archive ar(bytes);
+    patterns_->Serialize(ar);
+    EXPECT_EQ(ar.Remaining(), 0u);
   }
 
  private:
   Bench bench_;
   std::string path_;
   std::unique_ptr<QFCSystem> system_;
-  std::unique_ptr<ScriptedPatterns> patterns_;
+  std::unique_ptr<Patterns> patterns_;
   std::unique_ptr<QFCFailurePatternNode> root_;
+};
+
+// A KR40-family system whose patterns are scripted.
+class PatternBench : public SystemPatternBench<ScriptedPatterns, QFCAbstractFailurePattern> {
+ public:
+  explicit PatternBench(const std::vector<PinLine>& lines, const std::string& board = "KR40")
+      : SystemPatternBench("bench.csv", PinFileOf(lines, board), "Bench") {}
+
+  // Relay vectors as the states of positions 0 to 4 ("21100").
+  QFCAbstractFailureClass& AddClass(std::int32_t id, const std::vector<std::string>& vectors,
+                                    std::int32_t limit = 0) {
+    std::vector<QFTPossibility> possibilities;
+    for (const auto& v : vectors) possibilities.push_back(Vector(v));
+    return SystemPatternBench::AddClass(id, std::move(possibilities), limit);
+  }
+
+  // Connects a stand-in transfer interface and lets every module answer.
+  void Connect() {
+    system()->AddTransferInterface(std::make_unique<TestTransferInterface>(system()));
+    system()->GetTransferInterface()->Connect(true, 0, 0);
+    for (QFCAbstractPin* p : AllPins())
+      system()->GetRespondingModules().insert(static_cast<std::uint16_t>(p->GetModuleAddress()));
+  }
+
+ private:
+  static PinFile PinFileOf(const std::vector<PinLine>& lines, const std::string& board) {
+    PinFile file = PinFile::KR40(board);
+    file.pins.clear();
+    for (const auto& l : lines)
+      file.pins.push_back(l.pin + ";" + l.ecu + ";" + l.classes + ";" + l.module + ";" + l.channel);
+    return file;
+  }
 };
 
 // PinConfig as a text ("10202") for short assertions.

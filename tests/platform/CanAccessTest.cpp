@@ -4,13 +4,11 @@
 // trace, the socketcand text protocol and the hub program.
 #include "platform/CanAccess.h"
 
-#include <fcntl.h>
 #include <gtest/gtest.h>
 #include <netinet/in.h>
 #include <poll.h>
 #include <signal.h>
 #include <sys/socket.h>
-#include <sys/wait.h>
 #include <unistd.h>
 
 #include <atomic>
@@ -23,6 +21,7 @@
 
 #include "platform/Settings.h"
 #include "platform/can/SocketcandProtocol.h"
+#include "support/BackgroundProcess.h"
 #include "support/RunProcess.h"
 #include "systems/QFCSystemProperty.h"
 
@@ -53,37 +52,19 @@ CanFrameRecord Frame(std::uint32_t id, std::vector<std::uint8_t> data, bool exte
 // The hub program on a free port, stopped with the object.
 class HubProcess {
  public:
-  HubProcess() {
-    int out[2];
-    if (::pipe2(out, O_CLOEXEC) != 0) return;
-    pid_ = ::fork();
-    if (pid_ == 0) {
-      ::dup2(out[1], 1);
-      ::execl(FAULTBOX_CANHUB_PATH, FAULTBOX_CANHUB_PATH, "--port", "0", static_cast<char*>(nullptr));
-      ::_exit(127);
-    }
-    ::close(out[1]);
-    std::string line;
-    char c;
-    while (::read(out[0], &c, 1) == 1 && c != '\n') line += c;
-    ::close(out[0]);
-    port_ = std::atoi(line.c_str());
+  HubProcess() : process_({FAULTBOX_CANHUB_PATH, "--port", "0"}) {
+    port_ = std::atoi(process_.ReadLine().c_str());
   }
   ~HubProcess() { Stop(); }
   // The exit status of the hub, which must end cleanly on SIGTERM.
   int Stop() {
-    if (pid_ <= 0) return status_;
-    ::kill(pid_, SIGTERM);
-    int status = 0;
-    ::waitpid(pid_, &status, 0);
-    pid_ = -1;
-    status_ = WIFEXITED(status) ? WEXITSTATUS(status) : -1;
+    if (process_.Started()) status_ = process_.Stop(SIGTERM);
     return status_;
   }
   int Port() const { return port_; }
 
  private:
-  pid_t pid_ = -1;
+  test::BackgroundProcess process_;
   int port_ = 0;
   int status_ = -1;
 };

@@ -4,8 +4,6 @@
 #include <gtest/gtest.h>
 #include <poll.h>
 #include <signal.h>
-#include <spawn.h>
-#include <sys/wait.h>
 #include <termios.h>
 #include <unistd.h>
 
@@ -17,9 +15,8 @@
 
 #include "config/PinFileText.h"
 #include "kr40/KR40Simulator.h"
+#include "support/BackgroundProcess.h"
 #include "support/RunProcess.h"
-
-extern char** environ;
 
 namespace faultbox::sim {
 namespace {
@@ -74,10 +71,7 @@ class Port {
 };
 
 std::unique_ptr<KR40Simulator> StartOrFail(const KR40SimulatorOptions& options) {
-  std::string error;
-  auto sim = KR40Simulator::Start(options, &error);
-  EXPECT_NE(sim, nullptr) << error;
-  return sim;
+  return StartBench<KR40Simulator>(options, [](const std::string& error) { ADD_FAILURE() << error; });
 }
 
 KR40SimulatorOptions WithModules(KR40Protocol protocol, std::set<std::uint32_t> modules) {
@@ -331,74 +325,13 @@ TEST(KR40Simulator, LateAnswerIsHeldBackAndStopDoesNotWaitForIt) {
 // ---------------------------------------------------------------------------
 // The program
 
-// faultbox-sim running in the background with its standard output on a pipe.
-class SimProcess {
- public:
-  explicit SimProcess(const std::vector<std::string>& args) {
-    int fds[2];
-    if (::pipe(fds) != 0) return;
-    posix_spawn_file_actions_t actions;
-    posix_spawn_file_actions_init(&actions);
-    posix_spawn_file_actions_adddup2(&actions, fds[1], 1);
-    posix_spawn_file_actions_addclose(&actions, fds[0]);
-    std::vector<std::string> all{FAULTBOX_SIM_PATH};
-    all.insert(all.end(), args.begin(), args.end());
-    std::vector<char*> argv;
-    for (auto& a : all) argv.push_back(a.data());
-    argv.push_back(nullptr);
-    if (posix_spawn(&pid_, argv[0], &actions, nullptr, argv.data(), environ) != 0) pid_ = -1;
-    posix_spawn_file_actions_destroy(&actions);
-    ::close(fds[1]);
-    out_ = fds[0];
-  }
-  ~SimProcess() {
-    if (pid_ > 0) {
-      ::kill(pid_, SIGKILL);
-      ::waitpid(pid_, nullptr, 0);
-    }
-    if (out_ >= 0) ::close(out_);
-  }
-  // The next line on its standard output, "" at the end or after the limit.
-  std::string ReadLine() {
-    const auto end = std::chrono::steady_clock::now() + kLimit;
-    for (;;) {
-      const auto nl = buffer_.find('\n');
-      if (nl != std::string::npos) {
-        std::string line = buffer_.substr(0, nl);
-        buffer_.erase(0, nl + 1);
-        return line;
-      }
-      pollfd p{out_, POLLIN, 0};
-      if (std::chrono::steady_clock::now() >= end || ::poll(&p, 1, 100) < 0) return {};
-      if (p.revents == 0) continue;
-      char chunk[256];
-      const ssize_t n = ::read(out_, chunk, sizeof chunk);
-      if (n <= 0) return {};
-      buffer_.append(chunk, static_cast<std::size_t>(n));
-    }
-  }
-  // Sends `signal` and returns the exit status, -1 when it did not exit normally.
-  int Stop(int signal) {
-    ::kill(pid_, signal);
-    int status = 0;
-    ::waitpid(pid_, &status, 0);
-    pid_ = -1;
-    return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
-  }
-
- private:
-  pid_t pid_ = -1;
-  int out_ = -1;
-  std::string buffer_;
-};
-
 TEST(FaultboxSimProgram, PrintsThePortAndTheRelaysItSwitches) {
   test::TempDir dir;
   test::PinFileText text = test::PinFileText::KR40("KR080");
   text.pins = {"P1;ECU;1,2,3;20;3;S1"};
   const std::string pinFile = dir.Write("kr80.csv", text.Build());
   for (int signal : {SIGTERM, SIGINT}) {
-    SimProcess sim({"kr80", "--pin-file", pinFile, "--verbose"});
+    test::BackgroundProcess sim({FAULTBOX_SIM_PATH, "kr80", "--pin-file", pinFile, "--verbose"});
     const std::string path = sim.ReadLine();
     ASSERT_EQ(path.rfind("/dev/", 0), 0u) << path;
     Port port(path);

@@ -149,10 +149,7 @@ KR60SimulatorOptions FourModules(const std::string& bus) {
 }
 
 std::unique_ptr<KR60Simulator> StartOrFail(const KR60SimulatorOptions& options) {
-  std::string error;
-  auto sim = KR60Simulator::Start(options, &error);
-  EXPECT_NE(sim, nullptr) << error;
-  return sim;
+  return StartBench<KR60Simulator>(options, [](const std::string& error) { ADD_FAILURE() << error; });
 }
 
 // Sends frames one by one and checks that exactly `answers` came back, in this order.

@@ -16,13 +16,11 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <atomic>
 #include <cerrno>
 #include <cstring>
 #include <filesystem>
 #include <fstream>
 #include <functional>
-#include <thread>
 
 #include "platform/Text.h"
 #include "platform/can/CanDrivers.h"
@@ -175,20 +173,13 @@ class SocketCanChannel final : public CanDriverChannel {
                    std::shared_ptr<CanFrameSink> sink)
       : name_(std::move(name)),
         ifindex_(ifindex),
-        fd_(fd),
-        stopFd_(stopFd),
         controllerTiming_(controllerTiming),
-        sink_(std::move(sink)) {
-    reader_ = std::thread([this] { ReadLoop(); });
+        sink_(std::move(sink)),
+        reader_(fd, stopFd) {
+    reader_.Start([this] { ReadLoop(); });
   }
 
-  ~SocketCanChannel() override {
-    const std::uint64_t one = 1;
-    [[maybe_unused]] ssize_t n = ::write(stopFd_, &one, sizeof one);
-    reader_.join();
-    ::close(fd_);
-    ::close(stopFd_);
-  }
+  ~SocketCanChannel() override { reader_.Stop(); }
 
   CanResult Transmit(const CanFrameRecord& frame, std::string* error) override {
     can_frame cf{};
@@ -198,7 +189,7 @@ class SocketCanChannel final : public CanDriverChannel {
     cf.len = frame.length;
     std::memcpy(cf.data, frame.data, sizeof cf.data);
     for (;;) {
-      const ssize_t n = ::write(fd_, &cf, sizeof cf);
+      const ssize_t n = ::write(reader_.Fd(), &cf, sizeof cf);
       if (n == static_cast<ssize_t>(sizeof cf)) return CanResult::kOk;
       if (n < 0 && errno == EINTR) continue;
       *error = n < 0 && errno == ENOBUFS ? "the interface's transmit queue is full" : CanSystemError("write");
@@ -220,14 +211,9 @@ class SocketCanChannel final : public CanDriverChannel {
  private:
   void ReadLoop() {
     for (;;) {
-      pollfd p[2] = {{fd_, POLLIN, 0}, {stopFd_, POLLIN, 0}};
-      if (::poll(p, 2, -1) < 0) {
-        if (errno == EINTR) continue;
-        return;
-      }
-      if (p[1].revents != 0) return;
+      if (reader_.WaitReadable() != CanReaderThread::Wake::kReadable) return;
       can_frame cf{};
-      const ssize_t n = ::read(fd_, &cf, sizeof cf);
+      const ssize_t n = ::read(reader_.Fd(), &cf, sizeof cf);
       if (n == static_cast<ssize_t>(sizeof cf)) {
         sink_->Deliver(Convert(cf));
         continue;
@@ -261,11 +247,9 @@ class SocketCanChannel final : public CanDriverChannel {
 
   std::string name_;
   int ifindex_;
-  int fd_;
-  int stopFd_;
   bool controllerTiming_;
   std::shared_ptr<CanFrameSink> sink_;
-  std::thread reader_;
+  CanReaderThread reader_;
 };
 
 class SocketCanDriver final : public CanDriver {

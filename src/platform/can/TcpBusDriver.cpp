@@ -16,7 +16,6 @@
 #include <chrono>
 #include <cstring>
 #include <mutex>
-#include <thread>
 
 #include "platform/can/CanDrivers.h"
 #include "platform/can/SocketcandProtocol.h"
@@ -128,17 +127,11 @@ bool SendAll(int fd, const std::string& text) {
 class TcpChannel final : public CanDriverChannel {
  public:
   TcpChannel(Address address, int fd, int stopFd, SocketcandParser parser, std::shared_ptr<CanFrameSink> sink)
-      : address_(std::move(address)), fd_(fd), stopFd_(stopFd), sink_(std::move(sink)) {
-    reader_ = std::thread([this, p = std::move(parser)]() mutable { ReadLoop(std::move(p)); });
+      : address_(std::move(address)), sink_(std::move(sink)), reader_(fd, stopFd) {
+    reader_.Start([this, p = std::move(parser)]() mutable { ReadLoop(std::move(p)); });
   }
 
-  ~TcpChannel() override {
-    const std::uint64_t one = 1;
-    [[maybe_unused]] ssize_t n = ::write(stopFd_, &one, sizeof one);
-    reader_.join();
-    ::close(fd_);
-    ::close(stopFd_);
-  }
+  ~TcpChannel() override { reader_.Stop(); }
 
   CanResult Transmit(const CanFrameRecord& frame, std::string* error) override {
     if (frame.frameType != kCanFrameData) {
@@ -150,7 +143,7 @@ class TcpChannel final : public CanDriverChannel {
       return CanResult::kBusError;
     }
     std::lock_guard lock(sendMutex_);
-    if (!SendAll(fd_, FormatSocketcandSend(frame))) {
+    if (!SendAll(reader_.Fd(), FormatSocketcandSend(frame))) {
       lost_ = true;
       *error = CanSystemError("send");
       return CanResult::kBusError;
@@ -165,13 +158,10 @@ class TcpChannel final : public CanDriverChannel {
     Drain(parser);
     char buf[4096];
     for (;;) {
-      pollfd p[2] = {{fd_, POLLIN, 0}, {stopFd_, POLLIN, 0}};
-      if (::poll(p, 2, -1) < 0) {
-        if (errno == EINTR) continue;
-        break;
-      }
-      if (p[1].revents != 0) return;
-      const ssize_t n = ::recv(fd_, buf, sizeof buf, 0);
+      const CanReaderThread::Wake wake = reader_.WaitReadable();
+      if (wake == CanReaderThread::Wake::kStopped) return;
+      if (wake == CanReaderThread::Wake::kFailed) break;
+      const ssize_t n = ::recv(reader_.Fd(), buf, sizeof buf, 0);
       if (n < 0 && errno == EINTR) continue;
       if (n <= 0) break;
       parser.Feed(std::string_view(buf, static_cast<std::size_t>(n)));
@@ -195,12 +185,10 @@ class TcpChannel final : public CanDriverChannel {
   }
 
   Address address_;
-  int fd_;
-  int stopFd_;
   std::shared_ptr<CanFrameSink> sink_;
   std::mutex sendMutex_;
   std::atomic<bool> lost_{false};
-  std::thread reader_;
+  CanReaderThread reader_;
 };
 
 // Reads elements until one with the command `want`; an error element or the
