@@ -64,13 +64,12 @@ std::int32_t PlatformOfBoardType(const std::string& boardType) {
   return 0;
 }
 
-// A module the pin file marks as not fitted. "none" counts in any case, as
-// the format check accepts it.
-bool IsNotFitted(const std::string& text) {
+}  // namespace
+
+// "none" counts in any case, as the format check accepts it.
+bool QFCSystem::IsModuleNotFitted(const std::string& text) {
   return text.empty() || text == "-" || text == "#" || QFCFSHelper::EqualNoCase(text, "none");
 }
-
-}  // namespace
 
 QFCSystem::QFCSystem(std::string name, const std::string& pinFilePath, std::int32_t ecuVersion,
                      std::string author, std::string description)
@@ -82,9 +81,14 @@ QFCSystem::QFCSystem(std::string name, const std::string& pinFilePath, std::int3
   patterns_ = std::make_unique<QFCFailurePatterns>(this);
   rootFolder_ = std::make_unique<QFCFailurePatternNode>(this, patterns_.get());
   patterns_->SetRootFolder(rootFolder_.get());
+  // A transfer that failed half-way leaves relays switched: the reset puts
+  // every relay off and marks the patterns deactivated.
+  patterns_->SetHardwareReset([this] { return ResetHardware(); });
 }
 
 QFCSystem::~QFCSystem() {
+  // No refusal can keep a system that is going away: neither an activated
+  // pattern nor another system on the same HIL simulator stops this disconnect.
   DisconnectSilently();
   // Pattern pins refer to the pins of the hardware descriptions: they go first.
   rootFolder_.reset();
@@ -100,8 +104,7 @@ void QFCSystem::DisconnectSilently() {
   // left connected to a system that is going away.
   for (const auto& transferInterface : GetTransferInterfaces())
     if (transferInterface->IsConnected()) transferInterface->Connect(false, 0, 0);
-  connected_ = false;
-  respondingModules_.clear();
+  EnterDisconnectedState();
 }
 
 // ---- opening ----
@@ -246,7 +249,7 @@ HRESULT QFCSystem::GetLoadAddress(const std::string& key, std::uint32_t& address
   const QFCAbstractHardwareInfo* info = hardwareInfos_.empty() ? nullptr : hardwareInfos_.front().get();
   if (info != nullptr && (key == kFiuLoadAddress || key == kRsimLoadAddress)) {
     const std::string text = key == kFiuLoadAddress ? info->GetFIULoadModule() : info->GetRSIMLoadModule();
-    if (!IsNotFitted(text)) {
+    if (!IsModuleNotFitted(text)) {
       std::uint32_t cabinet = 0, rack = 0, slot = 0;
       if (QFCFSHelper::ParseModuleAddress(text, cabinet, rack, slot)) {
         // One hexadecimal digit per part, computed rather than written out and
@@ -259,7 +262,7 @@ HRESULT QFCSystem::GetLoadAddress(const std::string& key, std::uint32_t& address
     }
   } else if (info != nullptr && key == kOffsetLoadAddress) {
     std::string text;
-    if (info->GetFormatValue(key, text) == FAULTBOX_OK && !IsNotFitted(text)) {
+    if (info->GetFormatValue(key, text) == FAULTBOX_OK && !IsModuleNotFitted(text)) {
       // The conversion takes the value with or without its "0x".
       std::uint32_t value = 0;
       if (QFCFSHelper::StringToNumber(text, value, 16)) {

@@ -20,6 +20,7 @@ class QFCAbstractFailurePattern;
 class QFCAbstractPin;
 class QFCFailurePatterns;
 class QFCFailurePatternNode;
+class QFCSystemAdmin;
 
 class QFCSystem : public QFCSystemProperty {
  public:
@@ -70,6 +71,33 @@ class QFCSystem : public QFCSystemProperty {
   bool IsPatternActivated() const override;
   // True when a pattern has an activated pin; `pattern` is that pattern.
   bool HasActivatedPattern(QFCAbstractFailurePattern*& pattern) const;
+
+  // ---- connection to the hardware ----
+  // The setting (milliseconds, section Settings::kHardwareSection) for how
+  // long a KR60 reset lets the modules answer before it collects the answers.
+  static constexpr const char* kResetCollectionWaitKey = "ResetCollectionWait";
+  static constexpr std::int32_t kDefaultResetCollectionWait = 1000;
+  // The setting, or the default when it is missing; a value that is not a
+  // decimal number is reported (message 37, class 2) and the default used.
+  static std::int32_t GetResetCollectionWait();
+
+  // Connects (followed by a hardware reset) or disconnects the transfer
+  // interface. `report` shows the messages and notifies the views; without it
+  // the attempt is silent. Connecting a connected system does nothing;
+  // disconnecting is refused (E_FAULTBOX_DISCONNECT) while a pattern is
+  // activated, and both are refused while another system on the same HIL
+  // simulator is connected. A failed connect leaves the system disconnected
+  // with every pin unavailable.
+  HRESULT SetConnection(bool connect, bool report);
+  // Sends the reset messages to all modules, learns which modules answer and
+  // marks every pattern deactivated. Modules that stay silent are reported but
+  // do not fail the reset.
+  HRESULT ResetHardware();
+  // A pin is available when its module answered the last reset.
+  void UpdatePinAvailability();
+  // The administration asked for other systems on the same HIL simulator; a
+  // system without one never meets another.
+  void SetAdministration(const QFCSystemAdmin* admin) { admin_ = admin; }
 
   // The pattern collection and the root of the pattern folders.
   QFCFailurePatterns* GetFailurePatterns() const { return patterns_.get(); }
@@ -137,7 +165,17 @@ class QFCSystem : public QFCSystemProperty {
   // Adds the description's columns to the visible pin properties, keeping the flags of known ones.
   void RegisterColumns(const QFCAbstractHardwareInfo& info);
   bool CheckWritable() const;
+  // A load module text that stands for a module that is not fitted.
+  static bool IsModuleNotFitted(const std::string& text);
+  // Takes every transfer interface off the hardware and enters the
+  // disconnected state, without any check: for a system that is going away.
   void DisconnectSilently();
+  // Not connected, no responding module, every pin unavailable.
+  void EnterDisconnectedState();
+  // The platform parts of ResetHardware; `completed` is false when a send
+  // failed and the reset ended early.
+  HRESULT ResetKR60Hardware(bool& completed);
+  HRESULT ResetKR40Hardware(bool& completed);
 
   std::vector<std::unique_ptr<QFCAbstractHardwareInfo>> hardwareInfos_;
   std::vector<QFCECU*> ecus_;  // owned by the hardware descriptions
@@ -147,6 +185,7 @@ class QFCSystem : public QFCSystemProperty {
   bool modified_ = false;
   std::unique_ptr<QFCFailurePatterns> patterns_;
   std::unique_ptr<QFCFailurePatternNode> rootFolder_;
+  const QFCSystemAdmin* admin_ = nullptr;
 };
 
 }  // namespace faultbox

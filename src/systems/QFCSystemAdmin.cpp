@@ -51,6 +51,7 @@ HRESULT QFCSystemAdmin::Open(const std::string& pinFile, std::int32_t ecuVersion
                              const std::string& description, QFCSystem*& system) {
   system = nullptr;
   auto created = std::make_unique<QFCSystem>(GetDefaultName(), pinFile, ecuVersion, author, description);
+  created->SetAdministration(this);
   if (HRESULT result = created->OpenFromPinFile(); result != FAULTBOX_OK) return result;
   system = created.get();
   systems_.push_back(std::move(created));

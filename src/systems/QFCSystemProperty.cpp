@@ -162,15 +162,20 @@ bool QFCSystemProperty::IsInterfaceFree() const {
 }
 
 std::int32_t QFCSystemProperty::GetTransferTimeout() {
-  const std::optional<std::string> text = Settings::GetString(Settings::kComponentSection, "Timeout");
-  if (!text) return kDefaultTransferTimeout;
+  return ReadCountSetting(Settings::kComponentSection, "Timeout", kDefaultTransferTimeout);
+}
+
+std::int32_t QFCSystemProperty::ReadCountSetting(const char* section, const char* key,
+                                                 std::int32_t fallback) {
+  const std::optional<std::string> text = Settings::GetString(section, key);
+  if (!text) return fallback;
   std::uint32_t value = 0;
   // An empty value would convert to 0 and make every wait fail at once: it is
   // no number, like any other text the conversion refuses.
   if (QFCFSHelper::Trim(*text).empty() || !QFCFSHelper::StringToNumber(*text, value, 10) ||
       value > static_cast<std::uint32_t>(std::numeric_limits<std::int32_t>::max())) {
-    TheApp().ReportWarning(kMsgInvalidValue, "Timeout", "Value: " + *text + ", File: " + Settings::Path());
-    return kDefaultTransferTimeout;
+    TheApp().ReportWarning(kMsgInvalidValue, key, "Value: " + *text + ", File: " + Settings::Path());
+    return fallback;
   }
   return static_cast<std::int32_t>(value);
 }

@@ -96,6 +96,10 @@ class QFCSystemProperty : public QFCAbstractObjectData {
   // class 2) and 1000 is used. Read anew on every call: each transfer
   // interface asks once and keeps the answer.
   static std::int32_t GetTransferTimeout();
+  // A decimal count of the settings file, `fallback` when it is missing; a
+  // value that is not a decimal number from 0 up is reported (message 37,
+  // class 2) and `fallback` used.
+  static std::int32_t ReadCountSetting(const char* section, const char* key, std::int32_t fallback);
 
   // ---- transfer interfaces ----
   QFCAbstractTransferInterface* GetTransferInterface() const { return currentTransferInterface_; }
