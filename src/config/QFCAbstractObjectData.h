@@ -5,6 +5,7 @@
 
 #include <cstdint>
 #include <map>
+#include <memory>
 #include <string>
 #include <vector>
 
@@ -19,6 +20,13 @@ class QFCObjectObserver {
  public:
   virtual ~QFCObjectObserver() = default;
   virtual void OnUpdate(QFCAbstractObjectData* sender, int hint, void* extra) = 0;
+};
+
+// Something whose life must end with a model object's, such as the object's
+// automation wrapper, which has to learn that the object is gone.
+class QFCObjectAttachment {
+ public:
+  virtual ~QFCObjectAttachment() = default;
 };
 
 class QFCAbstractObjectData {
@@ -79,6 +87,11 @@ class QFCAbstractObjectData {
   // Tells every observer; an observer may remove itself while being told.
   void NotifyObservers(int hint = 0, void* extra = nullptr);
 
+  // The object keeps one attachment and destroys it when the object itself
+  // goes away; setting another destroys the one held.
+  void SetAttachment(std::unique_ptr<QFCObjectAttachment> attachment) { attachment_ = std::move(attachment); }
+  QFCObjectAttachment* GetAttachment() const { return attachment_.get(); }
+
  private:
   // The owner to forward a question to, or nullptr at the top.
   QFCAbstractObjectData* Upward() const { return owner_ != this ? owner_ : nullptr; }
@@ -88,6 +101,7 @@ class QFCAbstractObjectData {
   QFCAbstractObjectData* owner_;
   std::vector<QFCObjectObserver*> observers_;
   bool changed_ = false;
+  std::unique_ptr<QFCObjectAttachment> attachment_;
 };
 
 }  // namespace faultbox

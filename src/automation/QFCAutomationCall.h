@@ -1,0 +1,47 @@
+// The frame every automation member runs in: the process-wide mark that a
+// script's call is in progress, and the error information of the calling
+// thread that tells a script why a member failed.
+#pragma once
+
+#include <string>
+
+#include "host/ResultCodes.h"
+
+namespace faultbox {
+
+// What a failed member leaves for its caller.
+struct QFTErrorInfo {
+  HRESULT code = FAULTBOX_OK;
+  std::string description;
+};
+
+class QFCAutomationCall {
+ public:
+  // Clears the thread's error information and marks the call.
+  QFCAutomationCall();
+  ~QFCAutomationCall();
+  QFCAutomationCall(const QFCAutomationCall&) = delete;
+  QFCAutomationCall& operator=(const QFCAutomationCall&) = delete;
+
+  // True while any member runs. The document reads it to leave out the
+  // questions it would ask a user in front of a screen.
+  static bool InProgress();
+
+  // The member's result: a failure without error information of its own gets
+  // the description of its code (codes without one get none).
+  HRESULT Return(HRESULT code);
+  // The wrapper's model object is gone: E_FAULTBOX with the kept text.
+  HRESULT Detached(const std::string& keptText);
+};
+
+// Sets the thread's error information and answers `code`, for a member that
+// knows more than its code says.
+HRESULT RaiseError(HRESULT code, std::string description);
+// The error information of the last member called on this thread that failed
+// with one; false when there is none.
+bool GetErrorInfo(QFTErrorInfo& info);
+// The description a failure code gets when the member gives none: "" for
+// codes without one.
+std::string ErrorDescriptionOfCode(HRESULT code);
+
+}  // namespace faultbox
