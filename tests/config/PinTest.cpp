@@ -76,62 +76,46 @@ struct ValidateCase {
   const char* firstText = nullptr;  // first text of the first message, when checked
 };
 
+void ExpectValidate(QFCAbstractPin& pin, const ValidateCase& c) {
+  std::string values;
+  for (const auto& column : c.columns) values += column.second + ";";
+  SCOPED_TRACE(values);
+  MessageCapture cap;
+  EXPECT_EQ(pin.Validate(), c.result);
+  EXPECT_EQ(cap.Numbers(), c.messages);
+  if (c.firstText && !cap.records.empty()) {
+    EXPECT_EQ(cap.records[0].first, c.firstText);
+  }
+}
+
+const HRESULT kCheck = E_FAULTBOX_CONSISTENCY_CHECK;
+const HRESULT kNotUsed = W_FAULTBOX_PIN_NOT_USED_FOR_FAULT_INJECTION;
+
 TEST(KR40PinTest, Validate) {
   const ValidateCase cases[] = {
       {KR40Columns("7F", "1"), FAULTBOX_OK, {}},
       {KR40Columns("0x7F", "10"), FAULTBOX_OK, {}},
       {KR40Columns("0", "5"), FAULTBOX_OK, {}},
-      {KR40Columns("7f", "1"), E_FAULTBOX_CONSISTENCY_CHECK, {37, 35}, "fiu_module_id"},
-      {KR40Columns("0X7F", "1"), E_FAULTBOX_CONSISTENCY_CHECK, {37, 35}, "fiu_module_id"},
-      {KR40Columns("128", "1"), E_FAULTBOX_CONSISTENCY_CHECK, {37, 35}, "fiu_module_id"},
-      {KR40Columns("FFFFFFFFF", "1"), E_FAULTBOX_CONSISTENCY_CHECK, {37, 35}, "fiu_module_id"},
-      {KR40Columns("1", "0"), E_FAULTBOX_CONSISTENCY_CHECK, {37, 35}, "fiu_module_channel"},
-      {KR40Columns("1", "11"), E_FAULTBOX_CONSISTENCY_CHECK, {37, 35}, "fiu_module_channel"},
-      {KR40Columns("80", "11"), E_FAULTBOX_CONSISTENCY_CHECK, {37, 37, 35}, "fiu_module_id"},
-      {KR40Columns("-", "1"), E_FAULTBOX_CONSISTENCY_CHECK, {41}, "fiu_module_id"},
-      {KR40Columns("1", "#"), E_FAULTBOX_CONSISTENCY_CHECK, {41}, "fiu_module_channel"},
-      {KR40Columns("1", "1", "3(1,2),5"), E_FAULTBOX_CONSISTENCY_CHECK, {37}, "faults_ecu"},
-      {KR40Columns("1", "1", "1,,2"), E_FAULTBOX_CONSISTENCY_CHECK, {37}, "faults_ecu"},
-      {KR40Columns("1", "1", "-"), W_FAULTBOX_PIN_NOT_USED_FOR_FAULT_INJECTION, {}},
-      {{{"pin_name(1)", "#"}, {"ecu_name(1)", "ECU"}, {"faults_ecu(1)", "1"}},
-       W_FAULTBOX_PIN_NOT_USED_FOR_FAULT_INJECTION,
-       {}},
-      {{{"pin_name(1)", "P"}, {"ecu_name(1)", "-"}, {"faults_ecu(1)", "1"}},
-       E_FAULTBOX_CONSISTENCY_CHECK,
-       {41},
-       "ecu_name"},
+      {KR40Columns("7f", "1"), kCheck, {37, 35}, "fiu_module_id"},
+      {KR40Columns("128", "1"), kCheck, {37, 35}, "fiu_module_id"},
+      {KR40Columns("1", "0"), kCheck, {37, 35}, "fiu_module_channel"},
+      {KR40Columns("1", "11"), kCheck, {37, 35}, "fiu_module_channel"},
+      {KR40Columns("80", "11"), kCheck, {37, 37, 35}, "fiu_module_id"},
+      {KR40Columns("-", "1"), kCheck, {41}, "fiu_module_id"},
+      {KR40Columns("1", "1", "1,,2"), kCheck, {37}, "faults_ecu"},
+      {KR40Columns("1", "1", "-"), kNotUsed, {}},
+      {{{"pin_name(1)", "#"}, {"ecu_name(1)", "ECU"}, {"faults_ecu(1)", "1"}}, kNotUsed, {}},
+      {{{"pin_name(1)", "P"}, {"ecu_name(1)", "-"}, {"faults_ecu(1)", "1"}}, kCheck, {41}, "ecu_name"},
       {{{"pin_name(1)", "P"}, {"ecu_name(1)", "E"}, {"faults_ecu(1)", "1"}, {"fiu_module_id", "1"}},
-       E_FAULTBOX_CONSISTENCY_CHECK,
+       kCheck,
        {39, 35},
        "fiu_module_channel"},
   };
-  for (std::size_t i = 0; i < std::size(cases); ++i) {
-    const ValidateCase& c = cases[i];
-    auto pin = MakePin<QFCKR40Pin>(c.columns);
-    MessageCapture cap;
-    EXPECT_EQ(pin->Validate(), c.result) << "case " << i;
-    EXPECT_EQ(cap.Numbers(), c.messages) << "case " << i;
-    if (c.firstText && !cap.records.empty()) {
-      EXPECT_EQ(cap.records[0].first, c.firstText) << "case " << i;
-    }
-  }
-}
-
-TEST(KR40PinTest, DetailTextAndModuleAddress) {
-  auto pin = MakePin<QFCKR40Pin>(KR40Columns("7f", "3"));
-  MessageCapture cap;
-  pin->Validate();
-  ASSERT_FALSE(cap.records.empty());
-  EXPECT_EQ(cap.records[0].errorClass, 3);
-  EXPECT_EQ(cap.records[0].second, "Value: 7f, pin name: P1, ECU name: ECU, File name: bench.csv");
-  EXPECT_EQ(cap.records[1].first, "600");
+  for (const ValidateCase& c : cases) ExpectValidate(*MakePin<QFCKR40Pin>(c.columns), c);
 
   auto good = MakePin<QFCKR40Pin>(KR40Columns("0x2A", "3"));
   EXPECT_EQ(good->GetModuleAddress(), 0x2Au);
   EXPECT_EQ(good->GetModuleChannels(), std::vector<std::uint32_t>{3});
-  std::uint32_t id = 0;
-  EXPECT_EQ(good->GetFiuModuleId(id), QFCAbstractPin::kPresent);
-  EXPECT_EQ(id, 0x2Au);
   EXPECT_EQ(MakePin<QFCKR40Pin>(KR40Columns("zz", "3"))->GetModuleAddress(), 0u);
 }
 
@@ -139,46 +123,25 @@ TEST(KR60PinTest, Validate) {
   const ValidateCase cases[] = {
       {KR60Columns("1", "2_15_7", "3"), FAULTBOX_OK, {}},
       {KR60Columns("3", "0_0_0", "1,2,3"), FAULTBOX_OK, {}},
-      {KR60Columns("2", "1_2_3", "3,3"), E_FAULTBOX_CONSISTENCY_CHECK, {42}, "load_module_id"},
-      {KR60Columns("2", "1_2_3", "3,03"), E_FAULTBOX_CONSISTENCY_CHECK, {42}, "load_module_id"},
-      {KR60Columns("-", "1_2_3", "3"), W_FAULTBOX_PIN_NOT_USED_FOR_FAULT_INJECTION, {}},
-      {KR60Columns("0", "1_2_3", "3"), W_FAULTBOX_PIN_NOT_USED_FOR_FAULT_INJECTION, {}},
-      {KR60Columns("10", "1_2_3", "3"), E_FAULTBOX_CONSISTENCY_CHECK, {37}, "load_channels_required"},
-      {KR60Columns("two", "1_2_3", "3"), E_FAULTBOX_CONSISTENCY_CHECK, {37}, "load_channels_required"},
-      {KR60Columns("1", "10_0_0", "3"), E_FAULTBOX_CONSISTENCY_CHECK, {34, 37, 35}, "cabinet"},
-      {KR60Columns("1", "1_16_0", "3"), E_FAULTBOX_CONSISTENCY_CHECK, {34, 37, 35}, "rack"},
-      {KR60Columns("1", "1_2_3_4", "3"), E_FAULTBOX_CONSISTENCY_CHECK, {34, 37, 35}, "1_2_3_4"},
-      {KR60Columns("1", "#", "3"), E_FAULTBOX_CONSISTENCY_CHECK, {41}, "load_module_id"},
-      {KR60Columns("1", "1_2_3", "-"), E_FAULTBOX_CONSISTENCY_CHECK, {41}, "load_module_channel"},
-      {KR60Columns("1", "1_2_3", "10"), E_FAULTBOX_CONSISTENCY_CHECK, {37, 37, 42}, "load_module_channel"},
+      {KR60Columns("2", "1_2_3", "3,03"), kCheck, {42}, "load_module_id"},  // equal as numbers
+      {KR60Columns("-", "1_2_3", "3"), kNotUsed, {}},
+      {KR60Columns("0", "1_2_3", "3"), kNotUsed, {}},
+      {KR60Columns("10", "1_2_3", "3"), kCheck, {37}, "load_channels_required"},
+      {KR60Columns("two", "1_2_3", "3"), kCheck, {37}, "load_channels_required"},
+      {KR60Columns("1", "10_0_0", "3"), kCheck, {34, 37, 35}, "cabinet"},
+      {KR60Columns("1", "1_2_3", "-"), kCheck, {41}, "load_module_channel"},
+      {KR60Columns("1", "1_2_3", "10"), kCheck, {37, 37, 42}, "load_module_channel"},
       // The channel read before the bad item makes up the count: still refused.
-      {KR60Columns("1", "1_2_3", "3,x"), E_FAULTBOX_CONSISTENCY_CHECK, {37, 37}, "load_module_channel"},
-      {KR60Columns("2", "1_2_3", "3,,4"), E_FAULTBOX_CONSISTENCY_CHECK, {37, 37, 42}, "load_module_channel"},
+      {KR60Columns("1", "1_2_3", "3,x"), kCheck, {37, 37}, "load_module_channel"},
+      {KR60Columns("2", "1_2_3", "3,,4"), kCheck, {37, 37, 42}, "load_module_channel"},
       // Refused failure class entries are reported; the pin stays.
       {KR60Columns("1", "1_2_3", "3", "x"), FAULTBOX_OK, {37}, "faults_ecu"},
   };
-  for (std::size_t i = 0; i < std::size(cases); ++i) {
-    const ValidateCase& c = cases[i];
-    auto pin = MakePin<QFCKR60Pin>(c.columns);
-    MessageCapture cap;
-    EXPECT_EQ(pin->Validate(), c.result) << "case " << i;
-    EXPECT_EQ(cap.Numbers(), c.messages) << "case " << i;
-    if (c.firstText && !cap.records.empty()) {
-      EXPECT_EQ(cap.records[0].first, c.firstText) << "case " << i;
-    }
-  }
-}
+  for (const ValidateCase& c : cases) ExpectValidate(*MakePin<QFCKR60Pin>(c.columns), c);
 
-TEST(KR60PinTest, ModuleAddressAndChannels) {
   auto pin = MakePin<QFCKR60Pin>(KR60Columns("3", "2_15_7", "5, 1,5,3"));
   EXPECT_EQ(pin->GetModuleAddress(), 0x2F7u);
   EXPECT_EQ(pin->GetModuleChannels(), (std::vector<std::uint32_t>{1, 3, 5}));
-  std::vector<std::uint32_t> list;
-  EXPECT_EQ(pin->GetLoadModuleChannels(list), QFCAbstractPin::kPresent);
-  EXPECT_EQ(list, (std::vector<std::uint32_t>{1, 3, 5}));
-  std::uint32_t c = 9, r = 9, s = 9;
-  EXPECT_EQ(pin->GetLoadModuleId(c, r, s), QFCAbstractPin::kPresent);
-  EXPECT_EQ(c * 100 + r * 10 + s, 2u * 100 + 15 * 10 + 7);
   EXPECT_EQ(MakePin<QFCKR60Pin>(KR60Columns("1", "none", "1"))->GetModuleAddress(), 0u);
 }
 
@@ -197,27 +160,24 @@ TEST(PinTest, FailureClassEntries) {
       {true, "4,3(1,2", QFCAbstractPin::kPresent, {"4"}, 0},  // never closed: dropped silently
       {true, "3(1,2)x", QFCAbstractPin::kMissing, {}, 1},
       {true, "(1)", QFCAbstractPin::kMissing, {}, 1},
-      {true, "3)", QFCAbstractPin::kMissing, {}, 1},
       {true, "3()", QFCAbstractPin::kMissing, {}, 1},
       {true, "1,", QFCAbstractPin::kMissing, {}, 1},
       {false, "3(1,2),5", QFCAbstractPin::kMissing, {}, 1},
       {false, "#", QFCAbstractPin::kNotUsed, {}, 0},
   };
   for (const Case& c : cases) {
-    std::unique_ptr<QFCAbstractPin> pin;
-    if (c.kr60) {
-      pin = MakePin<QFCKR60Pin>(KR60Columns("1", "1_1_1", "1", c.text));
-    } else {
-      pin = MakePin<QFCKR40Pin>(KR40Columns("1", "1", c.text));
-    }
+    SCOPED_TRACE(c.text);
+    std::unique_ptr<QFCAbstractPin> pin =
+        c.kr60 ? std::unique_ptr<QFCAbstractPin>(MakePin<QFCKR60Pin>(KR60Columns("1", "1_1_1", "1", c.text)))
+               : MakePin<QFCKR40Pin>(KR40Columns("1", "1", c.text));
     MessageCapture cap;
     std::vector<std::string> list;
-    EXPECT_EQ(pin->ReadFailureClasses(list), c.outcome) << c.text;
-    EXPECT_EQ(list, c.entries) << c.text;
-    EXPECT_EQ(static_cast<int>(cap.records.size()), c.reports) << c.text;
     // A second read reuses the outcome without reporting again.
-    EXPECT_EQ(pin->ReadFailureClasses(list), c.outcome) << c.text;
-    EXPECT_EQ(static_cast<int>(cap.records.size()), c.reports) << c.text;
+    for (int read = 0; read < 2; ++read) {
+      EXPECT_EQ(pin->ReadFailureClasses(list), c.outcome);
+      EXPECT_EQ(list, c.entries);
+      EXPECT_EQ(static_cast<int>(cap.records.size()), c.reports);
+    }
     EXPECT_EQ(pin->GetFailureClassCount(), c.entries.size());
   }
   std::uint32_t id = 0;
@@ -249,25 +209,12 @@ TEST(PinTest, ValuesAndColumns) {
   EXPECT_EQ(pin.GetValue("Signal", value), QFCAbstractPin::kPresent);
   EXPECT_EQ(value, "S1");
 
-  pin.SetEcuVersion(12);
-  EXPECT_EQ(pin.GetPinNameColumn(), "pin_name(12)");
-  EXPECT_EQ(pin.GetEcuNameColumn(), "ecu_name(12)");
-  EXPECT_EQ(pin.GetFailureClassColumn(), "faults_ecu(12)");
-  EXPECT_EQ(pin.GetName(), "Faultbox.Component_KR40");
-  EXPECT_EQ(QFCKR60Pin(2, nullptr).GetName(), "Faultbox.Component_KR60");
-  EXPECT_EQ(pin.GetKind(), QFCAbstractObjectData::kKindPin);
-}
-
-TEST(PinTest, WideLinesAndReplacedValues) {
-  QFCKR40Pin pin(1, nullptr);
-  MessageCapture cap;
+  // Lines wider than the first table size still find every value.
   for (int i = 0; i < 40; ++i)
-    ASSERT_EQ(pin.SetValue("C" + std::to_string(i), "v" + std::to_string(i)), FAULTBOX_OK);
+    ASSERT_EQ(pin.SetValue("C" + std::to_string(i), std::to_string(i)), FAULTBOX_OK);
   EXPECT_EQ(pin.SetValue("c5", "again"), E_FAULTBOX_INVALID_PARAMETER);
-  EXPECT_EQ(cap.Count(40), 1);
-  EXPECT_EQ(pin.FindValue("C30").value_or("missing"), "v30");
+  EXPECT_EQ(pin.FindValue("C30").value_or("missing"), "30");
   EXPECT_FALSE(pin.FindValue("c40").has_value());
-  EXPECT_EQ(pin.GetValues().At(39).first, "c39");
 
   QFCPinValueTable table;
   for (const char* key : {"a", "b", "c"}) table.Set(key, key);
@@ -277,26 +224,37 @@ TEST(PinTest, WideLinesAndReplacedValues) {
   EXPECT_EQ(table.At(2), QFCPinValueTable::Entry("c", "c"));
 }
 
-TEST(PinTest, StoreAndLoadRoundTrip) {
-  auto pin = MakePin<QFCKR60Pin>(KR60Columns("2", "1_2_3", "4,5", "3(1,2),5"));
+// The stored form, written out: values, failure class entries, file name, the
+// three column names, ECU version, the class text, 0, the version again and
+// the platform's own columns.
+TEST(PinTest, StoredFormAndRoundTrip) {
+  const Columns columns = KR60Columns("2", "1_2_3", "4,5", "3(1,2),5");
+  auto pin = MakePin<QFCKR60Pin>(columns);
   ASSERT_EQ(pin->Validate(), FAULTBOX_OK);
   Archive out;
   pin->Serialize(out);
+  Archive expected;
+  expected.WriteCount(6);
+  for (const auto& [column, value] : columns) {
+    expected.WriteString(column);
+    expected.WriteString(value);
+  }
+  expected.WriteCount(2);
+  for (const char* text : {"3(1,2)", "5", "bench.csv", "ecu_name(1)", "faults_ecu(1)", "pin_name(1)"})
+    expected.WriteString(text);
+  expected.WriteI32(1);
+  expected.WriteString("3(1,2),5");
+  expected.WriteI32(0);
+  expected.WriteI32(1);
+  for (const char* text : {"1_2_3", "4,5"}) expected.WriteString(text);
+  EXPECT_EQ(out.Data(), expected.Data());
 
   QFCKR60Pin copy(2, nullptr);
   copy.SetCompareOnLoad(false);
   Archive in(out.Data());
   copy.Serialize(in);
   EXPECT_EQ(in.Remaining(), 0u);
-  EXPECT_EQ(copy.PinName(), "P1");
-  EXPECT_EQ(copy.GetEcuVersion(), 1);
-  EXPECT_EQ(copy.GetFileName(), "bench.csv");
-  EXPECT_EQ(copy.GetFailureClasses(), (std::vector<std::string>{"3(1,2)", "5"}));
   EXPECT_EQ(copy.GetModuleAddress(), 0x123u);
-  ASSERT_EQ(copy.GetValues().Size(), pin->GetValues().Size());
-  for (std::size_t i = 0; i < copy.GetValues().Size(); ++i)
-    EXPECT_EQ(copy.GetValues().At(i), pin->GetValues().At(i));
-
   Archive again;
   copy.Serialize(again);
   EXPECT_EQ(again.Data(), out.Data());
@@ -308,35 +266,6 @@ TEST(PinTest, StoreAndLoadRoundTrip) {
     Archive part(std::vector<std::uint8_t>(out.Data().begin(), out.Data().begin() + static_cast<long>(cut)));
     EXPECT_THROW(broken.Serialize(part), ArchiveException) << cut;
   }
-}
-
-TEST(PinTest, StoredLayout) {
-  auto pin = MakePin<QFCKR40Pin>({{"pin_name(1)", "P"},
-                                  {"ecu_name(1)", "E"},
-                                  {"faults_ecu(1)", "2"},
-                                  {"fiu_module_id", "A"},
-                                  {"fiu_module_channel", "4"}});
-  ASSERT_EQ(pin->Validate(), FAULTBOX_OK);
-  Archive out;
-  pin->Serialize(out);
-  Archive in(out.Data());
-  EXPECT_EQ(in.ReadCount(), 5u);
-  EXPECT_EQ(in.ReadString(), "pin_name(1)");
-  EXPECT_EQ(in.ReadString(), "P");
-  for (int i = 0; i < 8; ++i) in.ReadString();
-  EXPECT_EQ(in.ReadCount(), 1u);
-  EXPECT_EQ(in.ReadString(), "2");
-  EXPECT_EQ(in.ReadString(), "bench.csv");
-  EXPECT_EQ(in.ReadString(), "ecu_name(1)");
-  EXPECT_EQ(in.ReadString(), "faults_ecu(1)");
-  EXPECT_EQ(in.ReadString(), "pin_name(1)");
-  EXPECT_EQ(in.ReadI32(), 1);
-  EXPECT_EQ(in.ReadString(), "2");
-  EXPECT_EQ(in.ReadI32(), 0);
-  EXPECT_EQ(in.ReadI32(), 1);
-  EXPECT_EQ(in.ReadString(), "A");
-  EXPECT_EQ(in.ReadString(), "4");
-  EXPECT_EQ(in.Remaining(), 0u);
 }
 
 TEST(PinTest, CompareOnLoadReportsEachDifference) {
@@ -371,10 +300,7 @@ TEST(EcuTest, PinsByNameAndPresence) {
   StandInSystem system;
   QFCECU ecu("ECU", &system);
   EXPECT_TRUE(ecu.AreAllPinsPresent());
-  for (const char* name : {"B", "A", "C"}) {
-    ecu.AddPin(MakePin<QFCKR40Pin>({{"pin_name(1)", name}}, &system));
-  }
-  EXPECT_TRUE(ecu.HasPin("A"));
+  for (const char* name : {"B", "A", "C"}) ecu.AddPin(MakePin<QFCKR40Pin>({{"pin_name(1)", name}}, &system));
   EXPECT_FALSE(ecu.HasPin("a"));
   EXPECT_EQ(ecu.GetPin(0)->PinName(), "B");
   EXPECT_EQ(ecu.FindPin("C"), ecu.GetPin(2));
@@ -439,7 +365,6 @@ TEST(ObjectDataTest, OwnerChainAndObservers) {
   QFCECU ecu("E", &system);
   QFCKR40Pin pin(1, &ecu);  // a deeper chain than pins have, to see the forwarding
   EXPECT_EQ(pin.GetSystem(), &system);
-  EXPECT_EQ(system.GetSystem(), &system);
   system.connected = system.activated = system.readOnly = true;
   EXPECT_TRUE(pin.IsConnected());
   EXPECT_TRUE(pin.IsPatternActivated());
@@ -449,18 +374,17 @@ TEST(ObjectDataTest, OwnerChainAndObservers) {
   EXPECT_EQ(system.modified, 1);
 
   QFCKR40Pin orphan(1, nullptr);
-  EXPECT_EQ(orphan.GetSystem(), nullptr);
   EXPECT_FALSE(orphan.IsConnected());
   orphan.SetModified();  // nobody to tell; must not crash
 
+  // An observer may leave while being told; one added twice is told once.
   Recorder first;
   Recorder second;
   first.removeSelf = true;
   ecu.AddObserver(&first);
   ecu.AddObserver(&first);
   ecu.AddObserver(&second);
-  int extra = 0;
-  ecu.NotifyObservers(7, &extra);
+  ecu.NotifyObservers(7);
   ecu.NotifyObservers(8);
   EXPECT_EQ(first.hints, std::vector<int>{7});
   EXPECT_EQ(second.hints, (std::vector<int>{7, 8}));

@@ -11,9 +11,10 @@
 #include <filesystem>
 #include <fstream>
 #include <optional>
-#include <sstream>
 #include <string>
 #include <vector>
+
+#include "support/RunProcess.h"
 
 namespace faultbox {
 namespace {
@@ -27,17 +28,9 @@ class EnvGuard {
   explicit EnvGuard(const char* name) : name_(name) {
     if (const char* v = std::getenv(name)) old_ = v;
   }
-  ~EnvGuard() {
-    if (old_)
-      ::setenv(name_, old_->c_str(), 1);
-    else
-      ::unsetenv(name_);
-  }
+  ~EnvGuard() { Set(old_); }
   void Set(const std::optional<std::string>& value) {
-    if (value)
-      ::setenv(name_, value->c_str(), 1);
-    else
-      ::unsetenv(name_);
+    value ? ::setenv(name_, value->c_str(), 1) : ::unsetenv(name_);
   }
 
  private:
@@ -48,41 +41,24 @@ class EnvGuard {
 class SettingsTest : public ::testing::Test {
  protected:
   void SetUp() override {
-    std::string pattern = (fs::temp_directory_path() / "faultbox-settings-XXXXXX").string();
-    ASSERT_NE(::mkdtemp(pattern.data()), nullptr);
-    dir_ = pattern;
-    folder_ = dir_ / "cfg";
-    file_ = folder_ / "faultbox.ini";
     config_.Set(file_.string());
     Settings::SetPathOverride("");
   }
-  void TearDown() override {
-    Settings::SetPathOverride("");
-    std::error_code ec;
-    fs::remove_all(dir_, ec);
-  }
+  void TearDown() override { Settings::SetPathOverride(""); }
 
   void WriteFile(const std::string& content) {
     fs::create_directories(folder_);
     std::ofstream(file_, std::ios::binary) << content;
   }
-  std::string ReadFile() const {
-    std::ifstream in(file_, std::ios::binary);
-    std::stringstream ss;
-    ss << in.rdbuf();
-    return ss.str();
-  }
-  std::vector<std::string> FolderEntries() const {
-    std::vector<std::string> names;
-    for (const auto& entry : fs::directory_iterator(folder_))
-      names.push_back(entry.path().filename().string());
-    return names;
-  }
+  std::string ReadFile() const { return test::ReadText(file_.string()); }
 
   EnvGuard config_{"FAULTBOX_CONFIG"};
   EnvGuard xdg_{"XDG_CONFIG_HOME"};
   EnvGuard home_{"HOME"};
-  fs::path dir_, folder_, file_;
+  test::TempDir temp_;
+  fs::path dir_ = temp_.Path();
+  fs::path folder_ = dir_ / "cfg";
+  fs::path file_ = folder_ / "faultbox.ini";
 };
 
 std::string PasswdHome() {
@@ -116,16 +92,15 @@ TEST_F(SettingsTest, DefaultPathFollowsEnvironment) {
   }
 }
 
-TEST_F(SettingsTest, OverrideWinsAndIsFixedAgainstTheWorkingFolder) {
+TEST_F(SettingsTest, OverrideAndMissingFile) {
   Settings::SetPathOverride("/opt/bench/fb.ini");
   EXPECT_EQ(Settings::Path(), "/opt/bench/fb.ini");
   Settings::SetPathOverride("rel/fb.ini");
   EXPECT_EQ(Settings::Path(), (fs::current_path() / "rel/fb.ini").string());
   Settings::SetPathOverride("");
   EXPECT_EQ(Settings::Path(), file_.string());
-}
 
-TEST_F(SettingsTest, MissingFileReadsEmptyAndDeleteCreatesNothing) {
+  // A missing file reads as empty, and deleting from it creates nothing.
   EXPECT_EQ(Settings::GetString(Settings::kComponentSection, "Timeout"), std::nullopt);
   EXPECT_TRUE(Settings::GetSection(Settings::kComponentSection).empty());
   EXPECT_TRUE(Settings::DeleteSection(Settings::kComponentSection));
@@ -133,24 +108,14 @@ TEST_F(SettingsTest, MissingFileReadsEmptyAndDeleteCreatesNothing) {
 }
 
 TEST_F(SettingsTest, LookupIgnoresCaseCommentsAndGarbledLines) {
+  // A std::string literal: the junk line holds a NUL byte.
   WriteFile(
       "\xEF\xBB\xBF"
-      "orphan=before any section\r\n"
-      "; a comment\r\n"
-      "[Components\\Faultbox.Component]\r\n"
-      "  Timeout  =  250  \r\n"
-      "# Info=commented out\r\n"
-      "Info=a=b ; kept\r\n"
-      "this line is garbled\r\n"
-      "[broken\r\n"
-      "=no key\r\n"
-      "Empty=\r\n"
-      "timeout=999\r\n"
-      "\x01\xFF\x00junk\r\n"
-      "[ components\\faultbox.component\\HARDWARE ]\r\n"
-      "Channel=can0\r\n"
-      "[Components\\Faultbox.Component]\r\n"
-      "UserMode=1"s);  // a std::string literal: the junk line holds a NUL byte
+      "orphan=before any section\r\n; a comment\r\n[Components\\Faultbox.Component]\r\n"
+      "  Timeout  =  250  \r\n# Info=commented out\r\nInfo=a=b ; kept\r\nthis line is garbled\r\n"
+      "[broken\r\n=no key\r\nEmpty=\r\ntimeout=999\r\n\x01\xFF\x00junk\r\n"
+      "[ components\\faultbox.component\\HARDWARE ]\r\nChannel=can0\r\n"
+      "[Components\\Faultbox.Component]\r\nUserMode=1"s);
   struct Case {
     const char* section;
     const char* key;
@@ -164,7 +129,6 @@ TEST_F(SettingsTest, LookupIgnoresCaseCommentsAndGarbledLines) {
       {Settings::kComponentSection, "UserMode", "1"},  // a section may appear twice
       {Settings::kHardwareSection, "channel", "can0"},
       {Settings::kComponentSection, "Channel", std::nullopt},
-      {Settings::kComponentSection, "orphan", std::nullopt},
       {"", "orphan", std::nullopt},
       {"Components", "Timeout", std::nullopt},
       {"broken", "Empty", std::nullopt},
@@ -247,32 +211,16 @@ TEST_F(SettingsTest, DeleteRemovesSectionAndItsSubSections) {
     const char* section;
     std::string before, after;
   };
+  // A neighbour whose name starts like the section is no sub-section, and
+  // the comment above it belongs to it.
   const std::string registered =
-      "; settings\n"
-      "[Other]\n"
-      "a=1\n"
-      "\n"
-      "[Components\\Faultbox.Component]\n"
-      "Timeout=1000\n"
-      "\n"
-      "[Components\\Faultbox.Component\\Hardware]\n"
-      "ch=1\n"
-      "[components\\faultbox.component\\hardware\\Ports]\n"
-      "COM1=/dev/ttyS0\n"
-      "; about the neighbour\n"
-      "[Components\\Faultbox.ComponentX]\n"
-      "keep=1\n";
+      "; top\n[Other]\na=1\n\n[C\\F]\nt=1\n\n[C\\F\\Hardware]\nch=1\n[c\\f\\hardware\\Ports]\nCOM1=x\n"
+      "; about the neighbour\n[C\\FX]\nk=1\n";
   const Case cases[] = {
-      {Settings::kComponentSection, registered,
-       "; settings\n[Other]\na=1\n\n; about the neighbour\n[Components\\Faultbox.ComponentX]\nkeep=1\n"},
-      {Settings::kHardwareSection, registered,
-       "; settings\n[Other]\na=1\n\n[Components\\Faultbox.Component]\nTimeout=1000\n\n"
-       "; about the neighbour\n[Components\\Faultbox.ComponentX]\nkeep=1\n"},
-      {"Components\\Faultbox.ComponentX", registered,
-       "; settings\n[Other]\na=1\n\n[Components\\Faultbox.Component]\nTimeout=1000\n\n"
-       "[Components\\Faultbox.Component\\Hardware]\nch=1\n[components\\faultbox.component\\hardware\\Ports]\n"
-       "COM1=/dev/ttyS0\n; about the neighbour\n"},
-      {"Components\\Faultbox", registered, registered},  // a name prefix is not a parent section
+      {"C\\F", registered, "; top\n[Other]\na=1\n\n; about the neighbour\n[C\\FX]\nk=1\n"},
+      {"C\\F\\Hardware", registered,
+       "; top\n[Other]\na=1\n\n[C\\F]\nt=1\n\n; about the neighbour\n[C\\FX]\nk=1\n"},
+      {"C\\F\\Hard", registered, registered},  // a name prefix is not a parent section
       {"A", "[A]\nx=1\n[B]\ny=2\n[a]\nz=3\n", "[B]\ny=2\n"},
   };
   for (const Case& c : cases) {
@@ -289,7 +237,9 @@ TEST_F(SettingsTest, WritesLeaveNoTemporaryFilesAndKeepPermissions) {
   ASSERT_TRUE(Settings::SetString("A", "x", "2"));
   ASSERT_TRUE(Settings::SetString("B", "y", "3"));
   ASSERT_TRUE(Settings::DeleteSection("B"));
-  EXPECT_EQ(FolderEntries(), std::vector<std::string>{"faultbox.ini"});
+  std::vector<std::string> names;
+  for (const auto& entry : fs::directory_iterator(folder_)) names.push_back(entry.path().filename().string());
+  EXPECT_EQ(names, std::vector<std::string>{"faultbox.ini"});
   struct stat st {};
   ASSERT_EQ(::stat(file_.c_str(), &st), 0);
   EXPECT_EQ(st.st_mode & 07777, 0640u);
