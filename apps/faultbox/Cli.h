@@ -12,6 +12,8 @@
 #include "host/ResultCodes.h"
 
 namespace faultbox {
+class QFCAbstractFailurePattern;
+class QFCAbstractFailurePatternPin;
 class QFCFaultboxDoc;
 class QFCSystemAdmin;
 }  // namespace faultbox
@@ -34,6 +36,7 @@ void RegisterFcdCommands(CLI::App& app, Context& ctx);
 void RegisterSystemCommands(CLI::App& app, Context& ctx);
 void RegisterDocCommands(CLI::App& app, Context& ctx);
 void RegisterPatternCommands(CLI::App& app, Context& ctx);
+void RegisterHardwareCommands(CLI::App& app, Context& ctx);
 
 // A pin as the command line names it: ECU name, then pin name.
 using PinName = std::pair<std::string, std::string>;
@@ -51,6 +54,30 @@ std::unique_ptr<QFCFaultboxDoc> OpenDocument(QFCSystemAdmin& admin, const std::s
 // Answers the change's result, or the failure of loading or saving.
 using DocumentChange = std::function<HRESULT(QFCFaultboxDoc& doc, std::string& done)>;
 HRESULT EditDocument(const std::string& path, const DocumentChange& change);
+
+// What the pattern commands name; the rest is per command.
+struct PatternOptions {
+  std::string doc;
+  std::string name;
+  std::string newName;
+  std::string folder;
+  std::vector<PinName> pins;
+  int entry = 0;
+  int value = 0;
+  int classId = 0;
+  int relayVector = 0;
+};
+
+// The document's pattern of that name; nullptr (message 920) when there is none.
+QFCAbstractFailurePattern* FindPattern(QFCFaultboxDoc& doc, const std::string& name);
+// The pattern's pins for the names given; false (with a message per missing
+// pin) when one is not in the pattern, so that nothing is changed half-way.
+bool FindPatternPins(QFCAbstractFailurePattern& pattern, const std::vector<PinName>& names,
+                     std::vector<QFCAbstractFailurePatternPin*>& pins);
+// `pattern config` and `pattern set-class` on a loaded document, without
+// saving it; `done` gets a line per pin.
+HRESULT ConfigurePatternPins(QFCFaultboxDoc& doc, const PatternOptions& o, std::string& done);
+HRESULT SetPatternPinClass(QFCFaultboxDoc& doc, const PatternOptions& o, std::string& done);
 
 // Front-end message numbers (outside the component's own range).
 constexpr int kMsgCannotReadFile = 901;

@@ -20,18 +20,7 @@ namespace {
 
 constexpr int kMsgPatternActivated = 127;
 
-// What every pattern command names; the rest is per command.
-struct PatternOptions {
-  std::string doc;
-  std::string name;
-  std::string newName;
-  std::string folder;
-  std::vector<PinName> pins;
-  int entry = 0;
-  int value = 0;
-  int classId = 0;
-  int relayVector = 0;
-};
+}  // namespace
 
 QFCAbstractFailurePattern* FindPattern(QFCFaultboxDoc& doc, const std::string& name) {
   QFCAbstractFailurePattern* pattern = doc.GetSystem()->FindPattern(name);
@@ -39,8 +28,6 @@ QFCAbstractFailurePattern* FindPattern(QFCFaultboxDoc& doc, const std::string& n
   return pattern;
 }
 
-// The pattern's pins for the names given; false (with a message per missing
-// pin) when one is not in the pattern, so that nothing is changed half-way.
 bool FindPatternPins(QFCAbstractFailurePattern& pattern, const std::vector<PinName>& names,
                      std::vector<QFCAbstractFailurePatternPin*>& pins) {
   bool all = true;
@@ -54,6 +41,8 @@ bool FindPatternPins(QFCAbstractFailurePattern& pattern, const std::vector<PinNa
   }
   return all;
 }
+
+namespace {
 
 // The folder of that name below `folder`, its own children first; nullptr
 // when there is none.
@@ -152,7 +141,9 @@ std::string Outcome(const QFCAbstractFailurePatternPin& pin) {
          std::to_string(pin.GetRelayVectorIndex());
 }
 
-HRESULT Configure(QFCFaultboxDoc& doc, const PatternOptions& o, std::string& done) {
+}  // namespace
+
+HRESULT ConfigurePatternPins(QFCFaultboxDoc& doc, const PatternOptions& o, std::string& done) {
   QFCAbstractFailurePattern* pattern = FindPattern(doc, o.name);
   if (pattern == nullptr) return E_FAULTBOX_INVALID_PARAMETER;
   std::vector<QFCAbstractFailurePatternPin*> pins;
@@ -168,7 +159,7 @@ HRESULT Configure(QFCFaultboxDoc& doc, const PatternOptions& o, std::string& don
   return FAULTBOX_OK;
 }
 
-HRESULT SetClass(QFCFaultboxDoc& doc, const PatternOptions& o, std::string& done) {
+HRESULT SetPatternPinClass(QFCFaultboxDoc& doc, const PatternOptions& o, std::string& done) {
   QFCAbstractFailurePattern* pattern = FindPattern(doc, o.name);
   if (pattern == nullptr) return E_FAULTBOX_INVALID_PARAMETER;
   std::vector<QFCAbstractFailurePatternPin*> pins;
@@ -184,6 +175,8 @@ HRESULT SetClass(QFCFaultboxDoc& doc, const PatternOptions& o, std::string& done
   }
   return FAULTBOX_OK;
 }
+
+namespace {
 
 using Change = HRESULT (*)(QFCFaultboxDoc&, const PatternOptions&, std::string&);
 
@@ -206,8 +199,8 @@ void RegisterPatternCommands(CLI::App& app, Context& ctx) {
       {"reset", "Switch off every PinConfig entry of a pattern's pins", Reset},
       {"add-pins", "Add pins to a pattern", AddPins},
       {"remove-pins", "Remove pins from a pattern", RemovePins},
-      {"config", "Set a PinConfig entry (0 to 4) of pattern pins to 0 or 1", Configure},
-      {"set-class", "Give pattern pins a failure class and relay vector of your choice", SetClass},
+      {"config", "Set a PinConfig entry (0 to 4) of pattern pins to 0 or 1", ConfigurePatternPins},
+      {"set-class", "Give pattern pins a failure class and relay vector of your choice", SetPatternPinClass},
   };
   for (const PatternCommand& entry : commands) {
     auto o = std::make_shared<PatternOptions>();

@@ -55,6 +55,7 @@ constexpr Registrar kRegistrars[] = {
     RegisterSystemCommands,
     RegisterDocCommands,
     RegisterPatternCommands,
+    RegisterHardwareCommands,
 };
 
 }  // namespace

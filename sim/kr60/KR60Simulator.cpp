@@ -229,7 +229,8 @@ bool KR60Simulator::Open(std::string* error) {
   std::uint32_t initAccess = 0;
   // Not the host's receive event names: those must stay free for the systems.
   event_ = NamedEvent::CreateFirstFree("KR60_SIMULATOR_RECEIVE_%i");
-  if (!event_ || CanAccess::InitInterface(handle_, 0, 0, &initAccess) != CanResult::kOk ||
+  if (!event_ || CanAccess::ExcludeFromTrace(handle_) != CanResult::kOk ||
+      CanAccess::InitInterface(handle_, 0, 0, &initAccess) != CanResult::kOk ||
       CanAccess::SetEventNotification(handle_, event_, 1) != CanResult::kOk ||
       CanAccess::ActivateChannel(handle_) != CanResult::kOk) {
     const std::string text = event_ ? CanAccess::LastErrorText() : "no receive event";

@@ -56,11 +56,11 @@ ByteTrace::~ByteTrace() {
 }
 
 void ByteTrace::Sent(std::string_view port, const std::uint8_t* bytes, std::size_t count) {
-  Bytes(port, "TX", bytes, count);
+  Bytes(port, "tx", bytes, count);
 }
 
 void ByteTrace::Received(std::string_view port, const std::uint8_t* bytes, std::size_t count) {
-  Bytes(port, "RX", bytes, count);
+  Bytes(port, "rx", bytes, count);
 }
 
 void ByteTrace::Note(std::string_view port, std::string_view text) {
@@ -69,15 +69,16 @@ void ByteTrace::Note(std::string_view port, std::string_view text) {
 
 void ByteTrace::Bytes(std::string_view port, const char* direction, const std::uint8_t* bytes,
                       std::size_t count) {
+  // A line per byte, however the bytes were read: scripts then match one
+  // byte per line and never depend on how the reads happened to split.
   static const char kDigits[] = "0123456789ABCDEF";
-  std::string body = direction;
-  body.reserve(2 + count * 3);
   for (std::size_t i = 0; i < count; ++i) {
+    std::string body = direction;
     body += ' ';
     body += kDigits[bytes[i] >> 4];
     body += kDigits[bytes[i] & 0xF];
+    Line(port, body);
   }
-  Line(port, body);
 }
 
 void ByteTrace::Line(std::string_view port, std::string_view body) {

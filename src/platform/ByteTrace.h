@@ -31,8 +31,8 @@ class ByteTrace {
   ByteTrace(const ByteTrace&) = delete;
   ByteTrace& operator=(const ByteTrace&) = delete;
 
-  // One line each: "(secs.usecs) PORT TX 40", "(...) PORT RX C5 E5",
-  // "(...) PORT -- text".
+  // One line per byte: "(secs.usecs) PORT tx 40", "(...) PORT rx C5"; and
+  // "(...) PORT -- text" for a note.
   void Sent(std::string_view port, const std::uint8_t* bytes, std::size_t count);
   void Received(std::string_view port, const std::uint8_t* bytes, std::size_t count);
   void Note(std::string_view port, std::string_view text);

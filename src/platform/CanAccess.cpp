@@ -70,6 +70,7 @@ class Channel final : public CanFrameSink {
     CanFrameRecord f = frame;
     std::shared_ptr<NamedEvent> event;
     std::string traceName;
+    bool traced = true;
     {
       std::lock_guard lock(mutex);
       if (!active || !Accepts(f)) return;
@@ -81,8 +82,9 @@ class Channel final : public CanFrameSink {
       queue.push_back(f);
       event = this->event;
       traceName = this->traceName;
+      traced = this->traced;
     }
-    CanFrameTrace::Write(f, traceName);
+    if (traced) CanFrameTrace::Write(f, traceName);
     if (event) event->Set();
   }
 
@@ -96,6 +98,7 @@ class Channel final : public CanFrameSink {
   std::shared_ptr<CanDriverChannel> driverChannel;
   std::string busKey;
   std::string traceName;
+  bool traced = true;
   bool controllerTiming = false;
   bool active = false;
   std::deque<CanFrameRecord> queue;
@@ -501,6 +504,14 @@ CanResult ActivateChannel(CanHandle handle) {
   return CanResult::kOk;
 }
 
+CanResult ExcludeFromTrace(CanHandle handle) {
+  auto ch = FindChannel(handle);
+  if (!ch) return UnknownHandle("ExcludeFromTrace", handle);
+  std::lock_guard lock(ch->mutex);
+  ch->traced = false;
+  return CanResult::kOk;
+}
+
 CanResult TransmitMessage(CanHandle handle, const CanFrameRecord& frame) {
   auto ch = FindChannel(handle);
   if (!ch) return UnknownHandle("TransmitMessage", handle);
@@ -513,12 +524,14 @@ CanResult TransmitMessage(CanHandle handle, const CanFrameRecord& frame) {
                 "identifier " + std::to_string(frame.identifier) + " is out of range");
   std::shared_ptr<CanDriverChannel> driverChannel;
   std::string traceName, busKey;
+  bool traced = true;
   {
     std::lock_guard lock(ch->mutex);
     if (!ch->active)
       return Fail("TransmitMessage", CanResult::kNotActive, ch->busKey + ": the channel is not active");
     driverChannel = ch->driverChannel;
     traceName = ch->traceName;
+    traced = ch->traced;
     busKey = ch->busKey;
   }
   if (!driverChannel) return UnknownHandle("TransmitMessage", handle);
@@ -527,7 +540,7 @@ CanResult TransmitMessage(CanHandle handle, const CanFrameRecord& frame) {
   std::string error;
   const CanResult r = driverChannel->Transmit(f, &error);
   if (r != CanResult::kOk) return Fail("TransmitMessage", r, busKey + ": " + error);
-  CanFrameTrace::Write(f, traceName);
+  if (traced) CanFrameTrace::Write(f, traceName);
   return CanResult::kOk;
 }
 

@@ -311,6 +311,9 @@ CanResult SetAcceptance(CanHandle handle, std::uint32_t standardCode, std::uint3
 CanResult SetEventNotification(CanHandle handle, std::shared_ptr<NamedEvent> event, std::int32_t mode);
 // Frames are queued only while the channel is active.
 CanResult ActivateChannel(CanHandle handle);
+// Keeps the channel's frames out of the frame trace: a simulated bench in the
+// same process sees every frame the host sees, and would write each twice.
+CanResult ExcludeFromTrace(CanHandle handle);
 CanResult TransmitMessage(CanHandle handle, const CanFrameRecord& frame);
 // `*count`: in the room of `frames`, out the number read, oldest first.
 CanResult ReadReceiveQueue(CanHandle handle, CanFrameRecord* frames, std::uint32_t* count);

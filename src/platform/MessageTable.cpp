@@ -187,6 +187,13 @@ constexpr Entry kMessages[] = {
     {921, "There is no pin %1 of ECU %2 in the system's pin files (names are case-sensitive)."},
     {922, "The failure pattern does not hold pin %1 of ECU %2; add it with `faultbox pattern add-pins`."},
     {923, "There is no ECU %1 in the system's pin files (names are case-sensitive)."},
+    {930, "There is no shell command %1; `help` lists the commands."},
+    {931, "Shell command %1: %2"},
+    {932, "The simulated bench for %1 cannot start: %2"},
+    {933,
+     "Pattern %1 of %2 could not be switched off, nor the hardware reset: its relays may still be switched. "
+     "Reset or switch off the bench."},
+    {934, "The changes to %1 were not saved; `save` in the shell saves them."},
 };
 
 // Numbers 6701 and 6752 are document type descriptions: newline-separated

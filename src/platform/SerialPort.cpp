@@ -13,6 +13,7 @@
 #include <cerrno>
 #include <cstring>
 #include <ctime>
+#include <mutex>
 
 #include "platform/ByteTrace.h"
 #include "platform/Settings.h"
@@ -35,6 +36,16 @@ timespec ToTimespec(Clock::duration duration) {
   ts.tv_sec = static_cast<time_t>(seconds.count());
   ts.tv_nsec = static_cast<long>(nanoseconds.count());
   return ts;
+}
+
+struct PortOverride {
+  std::mutex mutex;
+  std::map<std::string, std::string> paths;  // keys in upper case
+};
+
+PortOverride& TheOverride() {
+  static PortOverride* o = new PortOverride;
+  return *o;
 }
 
 }  // namespace
@@ -80,8 +91,21 @@ std::optional<int> SerialPort::PortNumber(std::string_view portName) {
   return number;
 }
 
+void SerialPort::SetOverride(std::map<std::string, std::string> paths) {
+  std::map<std::string, std::string> upper;
+  for (auto& [name, path] : paths) upper[ToUpper(name)] = std::move(path);
+  PortOverride& o = TheOverride();
+  std::lock_guard lock(o.mutex);
+  o.paths = std::move(upper);
+}
+
 std::string SerialPort::DevicePath(const std::string& portName) {
   if (portName.empty()) return {};
+  {
+    PortOverride& o = TheOverride();
+    std::lock_guard lock(o.mutex);
+    if (auto it = o.paths.find(ToUpper(portName)); it != o.paths.end()) return it->second;
+  }
   if (auto mapped = Settings::GetString(kPortSection, portName); mapped && !mapped->empty())
     // A relative path would depend on the folder the program was started in.
     return mapped->front() == '/' ? *mapped : std::string();

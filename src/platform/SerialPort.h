@@ -7,6 +7,7 @@
 #include <chrono>
 #include <cstddef>
 #include <cstdint>
+#include <map>
 #include <memory>
 #include <optional>
 #include <string>
@@ -44,9 +45,14 @@ class SerialPort {
 
   // n of "COMn" (any case, n decimal); nothing for other names.
   static std::optional<int> PortNumber(std::string_view portName);
-  // The device path of a port: the settings' entry for the name, else
-  // /dev/ttyS<n-1> for "COMn" with n >= 1; "" when there is none.
+  // The device path of a port: the process override's entry for the name,
+  // then the settings' entry, else /dev/ttyS<n-1> for "COMn" with n >= 1; ""
+  // when there is none.
   static std::string DevicePath(const std::string& portName);
+  // Port name to device path for this process only, consulted before the
+  // settings (used to put a system's port on a simulated bench); names are
+  // compared without regard to case. An empty map removes the override.
+  static void SetOverride(std::map<std::string, std::string> paths);
   // Whether the port could be opened now; it is closed again at once.
   static bool CanOpen(const std::string& portName);
 

@@ -164,7 +164,7 @@ TEST_P(FailureTest, TransferStopsAtTheFailedAnswer) {
   const std::vector<std::uint8_t> sent = {0x40, 0x90, 0x65, 0x84};
   std::string traced;
   const std::string text = test::ReadText(trace);
-  for (std::size_t at = 0; (at = text.find("COM1 TX ", at)) != std::string::npos; at += 8)
+  for (std::size_t at = 0; (at = text.find("COM1 tx ", at)) != std::string::npos; at += 8)
     traced += text.substr(at + 8, 2) + " ";
   EXPECT_EQ(traced, "40 90 65 84 ");
   ASSERT_TRUE(bench.sim().WaitForProcessed(sent.size(), kLimit));

@@ -1,0 +1,398 @@
+// `faultbox activate` and `faultbox shell` through the real program on the
+// built-in simulated benches of both platforms: the relays the bench shows
+// after activation and after deactivation, the trace of what went over the
+// bus or line, and the refusals that must not leave a relay switched.
+#include <gtest/gtest.h>
+#include <signal.h>
+
+#include <filesystem>
+#include <regex>
+#include <sstream>
+#include <string>
+#include <string_view>
+
+#include "support/BackgroundProcess.h"
+#include "support/RunProcess.h"
+
+namespace faultbox {
+namespace {
+
+using test::ProcessResult;
+using test::ReadText;
+using test::RunFaultbox;
+using test::TempDir;
+
+// One sample bench, the pattern built on it, and what the simulated bench
+// must show while the pattern is activated.
+struct BenchCase {
+  const char* name;
+  std::vector<const char*> files;  // samples of data/, the pin file first
+  const char* document;
+  // ECU, pin, failure class, relay vector.
+  std::vector<std::array<const char*, 4>> pins;
+  std::vector<std::string> relaysOn;
+  // Every line the trace holds (a serial trace also has "--" notes).
+  const char* traceLine;
+  // Lines the trace must hold: a reset, the activation's last command, an answer.
+  std::vector<const char*> traced;
+};
+
+void PrintTo(const BenchCase& c, std::ostream* os) {
+  *os << c.name;
+}
+
+const BenchCase kBenches[] = {
+    // Class 1 opens the line: load relay 2 of the pin's first load channel.
+    {"KR60",
+     {"kr60_bench.csv", "kr60_additional.csv"},
+     "chassis.fsa",
+     {{"ECM", "A12", "1", "0"}, {"ABS_ESP", "1", "1", "0"}},
+     {"LOAD 0x011: channel 1 relay 2 on", "LOAD 0x013: channel 1 relay 2 on"},
+     R"(\(\d+\.\d{6}\) \S+ [0-9A-F]{8}#([0-9A-F]{2}){0,8})",
+     // Offset 0x10: a reset to every LOAD module, a relay frame to LOAD 0x011,
+     // the commit to every LOAD module that loaded relays, 0x011's answer to it.
+     {"00401000#81", "00401011#8204FE", "00401000#820500", "00411011#4205"}},
+    // Protocol A: the state of a relay is its pin's PinConfig as bits.
+    {"KR40",
+     {"kr40_bench.csv"},
+     "body.fss",
+     {{"BCM", "X1.1", "2", "1"}, {"DCU_FL", "X1.3", "2", "0"}},
+     {"FIU 0x10: relay 1 (state 3) on", "FIU 0x11: relay 2 (state 2) on"},
+     R"(\(\d+\.\d{6}\) COM1 ((tx|rx) [0-9A-F]{2}|-- .*))",
+     // The reset, the execute, module 0x10's answer to its selection.
+     {"COM1 tx 49", "COM1 tx 51", "COM1 rx D0"}},
+    // Protocol B: the state is the failure class; nothing is answered.
+    {"KR80",
+     {"kr80_bench.csv"},
+     "powertrain.fss",
+     {{"ECM", "K12", "2", "0"}, {"TCU", "7", "3", "0"}},
+     {"FIU 0x20: relay 1 (state 2) on", "FIU 0x21: relay 1 (state 3) on"},
+     R"(\(\d+\.\d{6}\) COM1 (tx [0-9A-F]{2}|-- .*))",
+     // The reset, the execute, the selection of module 0x21.
+     {"COM1 tx 9E", "COM1 tx 9F", "COM1 tx 21"}},
+};
+
+class HardwareCli : public ::testing::Test {
+ protected:
+  void SetUp() override {
+    // Empty channel and port tables: the simulator is the default. A short
+    // collection wait keeps the KR60 resets quick; the serial answer waits
+    // (100 ms rather than 20) give the simulator's thread time on a busy
+    // machine, at the price of a slow KR40 reset (125 silent addresses).
+    settings_ = dir_.Write("faultbox.ini",
+                           "[Components\\Faultbox.Component]\nTimeout=5000\n"
+                           "[Components\\Faultbox.Component\\Hardware]\nResetCollectionWait=300\n");
+  }
+
+  ProcessResult Run(const std::vector<std::string>& args, const std::string& input = {}) {
+    return RunFaultbox(args, input,
+                       {"NORVIK_ROOT=" FAULTBOX_BINARY_DIR "/data/norvik", "FAULTBOX_CONFIG=" + settings_});
+  }
+  void Ok(const std::vector<std::string>& args) {
+    const ProcessResult r = Run(args);
+    ASSERT_EQ(r.exitCode, 0) << args[0] << " " << args[1] << "\n" << r.out << r.err;
+  }
+
+  // The bench's document with the pattern "Test" holding the case's pins.
+  std::string MakeDocument(const BenchCase& c) {
+    for (const char* file : c.files)
+      std::filesystem::copy_file(std::string(FAULTBOX_SOURCE_DIR "/data/") + file, dir_.File(file));
+    const std::string doc = dir_.File(c.document);
+    Ok({"doc", "new", "--pin-file", dir_.File(c.files.front()), doc});
+    Ok({"pattern", "create", doc, "Test"});
+    for (const auto& pin : c.pins) {
+      Ok({"pattern", "add-pins", doc, "Test", "--pin", pin[0], pin[1]});
+      Ok({"pattern", "set-class", doc, "Test", "--pin", pin[0], pin[1], pin[2], pin[3]});
+    }
+    return doc;
+  }
+
+  // Checks the trace's form and that it holds the case's lines.
+  static void ExpectTrace(const BenchCase& c, const std::string& path) {
+    std::istringstream lines(ReadText(path));
+    const std::regex form(c.traceLine);
+    std::string line, all;
+    int count = 0;
+    while (std::getline(lines, line)) {
+      EXPECT_TRUE(std::regex_match(line, form)) << line;
+      all += line + "\n";
+      ++count;
+    }
+    EXPECT_GT(count, 4);
+    for (const char* wanted : c.traced)
+      EXPECT_NE(all.find(wanted), std::string::npos) << wanted << "\n" << all;
+    // The activation's relay frame goes out once; the simulated bench's own
+    // side of the bus must not write it a second time.
+    if (std::string_view(c.name) == "KR60") {
+      const std::string once = " 00401011#8204FEFFFFFF7FFF\n";
+      EXPECT_EQ(all.find(once), all.rfind(once)) << once << "\n" << all;
+    }
+  }
+
+  TempDir dir_;
+  std::string settings_;
+};
+
+class HardwareCliTest : public HardwareCli, public ::testing::WithParamInterface<BenchCase> {};
+
+// The relay lines printed under "relays WHEN:" (or on that line itself).
+std::vector<std::string> RelaysShown(const std::string& out, const std::string& when) {
+  const std::string heading = "relays " + when + ":";
+  const std::size_t at = out.find(heading);
+  if (at == std::string::npos) return {"(no '" + heading + "')"};
+  std::istringstream rest(out.substr(at + heading.size()));
+  std::string line;
+  std::getline(rest, line);
+  if (!line.empty()) return {line.substr(1)};
+  std::vector<std::string> shown;
+  while (std::getline(rest, line) && line.rfind("  ", 0) == 0) shown.push_back(line.substr(2));
+  return shown;
+}
+
+const std::vector<std::string> kAllOff = {"all relays off"};
+
+TEST_P(HardwareCliTest, ActivateHoldsAndSwitchesBack) {
+  const BenchCase& c = GetParam();
+  const std::string doc = MakeDocument(c);
+  const std::string trace = dir_.File("trace.log");
+  const ProcessResult r =
+      Run({"activate", doc, "Test", "--hold", "0", "--hardware", "sim", "--trace", trace});
+  ASSERT_EQ(r.exitCode, 0) << r.out << r.err;
+  EXPECT_EQ(r.out.rfind("hardware: simulated ", 0), 0u) << r.out;
+  EXPECT_EQ(RelaysShown(r.out, "after activation"), c.relaysOn) << r.out;
+  EXPECT_EQ(RelaysShown(r.out, "after deactivation"), kAllOff) << r.out;
+  EXPECT_NE(r.out.find("holding for 0 s"), std::string::npos) << r.out;
+  EXPECT_NE(r.out.find("\ndisconnected\n"), std::string::npos) << r.out;
+  ExpectTrace(c, trace);
+}
+
+TEST_P(HardwareCliTest, ShellKeepsThePatternActivatedBetweenCommands) {
+  const BenchCase& c = GetParam();
+  const std::string doc = MakeDocument(c);
+  const std::string trace = dir_.File("trace.log");
+  const ProcessResult r = Run({"shell", doc, "--trace", trace},
+                              "connect\n"
+                              "activate Test\n"
+                              "status\n"
+                              "relays\n"
+                              "deactivate Test\n"
+                              "relays\n"
+                              "disconnect\n");
+  ASSERT_EQ(r.exitCode, 0) << r.out << r.err;
+  // Without --hardware and without channels or ports in the settings: the simulator.
+  EXPECT_EQ(r.out.rfind("hardware: simulated ", 0), 0u) << r.out;
+  // Each command is echoed, as the input is no terminal.
+  EXPECT_NE(r.out.find("> activate Test\nactivated Test: "), std::string::npos) << r.out;
+  EXPECT_EQ(RelaysShown(r.out, "after activation"), c.relaysOn) << r.out;
+  const std::string status = "activated: Test: " + std::string(c.pins[0][0]) + " " + c.pins[0][1];
+  EXPECT_NE(r.out.find(status), std::string::npos) << r.out;
+  // `relays` between the two shows the same as after the activation.
+  EXPECT_EQ(RelaysShown(r.out.substr(r.out.find("> relays")), "now"), c.relaysOn) << r.out;
+  EXPECT_EQ(RelaysShown(r.out, "after deactivation"), kAllOff) << r.out;
+  ExpectTrace(c, trace);
+}
+
+INSTANTIATE_TEST_SUITE_P(Platforms, HardwareCliTest, ::testing::ValuesIn(kBenches),
+                         [](const auto& info) { return std::string(info.param.name); });
+
+// The benches whose resets are quick: KR60 and KR80 (whose board answers nothing).
+class QuickBenchTest : public HardwareCliTest {};
+
+// The end of the input while a pattern is activated: the session switches it
+// off and disconnects by itself.
+TEST_P(QuickBenchTest, EndOfInputSwitchesOffWhatIsActivated) {
+  const BenchCase& c = GetParam();
+  const std::string doc = MakeDocument(c);
+  const ProcessResult r = Run({"shell", doc, "--hardware", "sim"}, "connect\nactivate Test\n");
+  ASSERT_EQ(r.exitCode, 0) << r.out << r.err;
+  EXPECT_EQ(RelaysShown(r.out, "after activation"), c.relaysOn) << r.out;
+  const std::size_t deactivated = r.out.find("deactivated Test");
+  ASSERT_NE(deactivated, std::string::npos) << r.out;
+  EXPECT_EQ(RelaysShown(r.out, "after deactivation"), kAllOff) << r.out;
+  EXPECT_NE(r.out.find("disconnected", deactivated), std::string::npos) << r.out;
+}
+
+INSTANTIATE_TEST_SUITE_P(Platforms, QuickBenchTest, ::testing::Values(kBenches[0], kBenches[2]),
+                         [](const auto& info) { return std::string(info.param.name); });
+
+// On the KR80 bench, which answers nothing: its resets are quick.
+const BenchCase& kQuickBench = kBenches[2];
+
+class HardwareCliRefusals : public HardwareCli {
+ protected:
+  std::string Document() { return MakeDocument(kQuickBench); }
+};
+
+// Each bad line is refused with its message, the lines after it still run,
+// and the session ends with status 1.
+TEST_F(HardwareCliRefusals, BadShellCommandsAreReportedAndTheSessionGoesOn) {
+  const std::string doc = Document();
+  const struct {
+    const char* line;
+    const char* message;
+  } cases[] = {
+      {"frobnicate", "error 930"},
+      {"activate", "error 931"},
+      {"activate Test --pin ECM", "error 931"},
+      {"deactivate Test --pin ECM K12", "error 931"},
+      {"sleep soon", "error 931"},
+      {"set-class Test --pin ECM K12 two", "error 931"},
+      {"config Test --pin ECM K12 5 1", "error 931"},
+      {"activate \"Test", "error 931"},
+      {"activate Nothing", "error 920"},
+      {"activate Test --pin ECM K13", "error 922"},
+      {"relays", ""},  // the simulator shows its relays: no refusal
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.line);
+    const ProcessResult r = Run({"shell", doc, "--hardware", "sim"}, std::string(c.line) + "\nstatus\n");
+    if (*c.message == '\0') {
+      EXPECT_EQ(r.exitCode, 0) << r.out << r.err;
+      continue;
+    }
+    EXPECT_EQ(r.exitCode, 1) << r.out << r.err;
+    EXPECT_NE(r.err.find(c.message), std::string::npos) << r.err;
+    EXPECT_NE(r.out.find("> status\ndocument: "), std::string::npos) << r.out;
+  }
+}
+
+TEST_F(HardwareCliRefusals, ShellChangesAreSavedOnlyWhenAsked) {
+  const std::string doc = Document();
+  // config switches entry 0 of TCU 7 on: with entry 2 of its class 3 the
+  // interlock takes relay vector 1.
+  const ProcessResult unsaved = Run({"shell", doc, "--hardware", "sim"}, "config Test --pin TCU 7 0 1\n");
+  EXPECT_EQ(unsaved.exitCode, 0) << unsaved.out << unsaved.err;
+  EXPECT_NE(unsaved.out.find("TCU 7: PinConfig 12122, failure class 3, relay vector 1"), std::string::npos)
+      << unsaved.out;
+  EXPECT_NE(unsaved.err.find("warning 934"), std::string::npos) << unsaved.err;
+  EXPECT_NE(Run({"doc", "show", doc}).out.find("TCU 7: PinConfig 02122, failure class 3, relay vector 0"),
+            std::string::npos);
+
+  const ProcessResult saved =
+      Run({"shell", doc, "--hardware", "sim"}, "set-class Test --pin ECM K12 3 1\nsave\n");
+  EXPECT_EQ(saved.exitCode, 0) << saved.out << saved.err;
+  EXPECT_NE(saved.out.find("saved " + doc), std::string::npos) << saved.out;
+  EXPECT_EQ(saved.err.find("warning 934"), std::string::npos) << saved.err;
+  EXPECT_NE(Run({"doc", "show", doc}).out.find("ECM K12: PinConfig 12122, failure class 3, relay vector 1"),
+            std::string::npos);
+}
+
+TEST_F(HardwareCliRefusals, AMissingPatternIsRefusedBeforeTheHardwareIsTouched) {
+  const std::string doc = Document();
+  const struct {
+    std::vector<std::string> args;
+    const char* message;
+  } cases[] = {
+      {{"activate", doc, "No such pattern", "--hold", "0"},
+       "error 920: There is no failure pattern No such pattern"},
+      {{"activate", doc, "Test", "--pin", "ECM", "K13", "--hold", "0"}, "error 922"},
+      {{"activate", dir_.File("missing.fss"), "Test", "--hold", "0"}, "error 178"},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.args[2]);
+    const ProcessResult r = Run(c.args);
+    EXPECT_EQ(r.exitCode, 1) << r.out << r.err;
+    EXPECT_NE(r.err.find(c.message), std::string::npos) << r.err;
+    EXPECT_EQ(r.out.find("hardware:"), std::string::npos) << r.out;
+  }
+}
+
+// Pins that are not ready (here: their ECU is disabled) are left out; when
+// none is left, nothing was activated and the command fails.
+TEST_F(HardwareCliRefusals, PinsThatAreNotReadyAreLeftOut) {
+  const std::string doc = Document();
+  const struct {
+    const char* disable;
+    int exitCode;
+    const char* told;
+    std::vector<std::string> relays;
+  } cases[] = {
+      {"ECM",
+       0,
+       "activated Test: TCU 7\nleft out (not ready, see the messages): ECM K12\n",
+       {"FIU 0x21: relay 1 (state 3) on"}},
+      {"TCU", 1, "Test was not activated: no pin is ready (see the messages): ECM K12, TCU 7\n", kAllOff},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.disable);
+    Ok({"ecu", "disable", doc, c.disable});
+    const ProcessResult r = Run({"activate", doc, "Test", "--hold", "0"});
+    EXPECT_EQ(r.exitCode, c.exitCode) << r.out << r.err;
+    EXPECT_NE(r.out.find(c.told), std::string::npos) << r.out;
+    EXPECT_EQ(RelaysShown(r.out, c.exitCode == 0 ? "after activation" : "now"), c.relays) << r.out;
+    EXPECT_NE(r.out.find("\ndisconnected\n"), std::string::npos) << r.out;
+  }
+}
+
+// The settings decide the default: a serial port in the port table means
+// the real line, which a missing device fails to connect.
+TEST_F(HardwareCliRefusals, SettingsWithAPortMakeTheRealHardwareTheDefault) {
+  const std::string doc = Document();
+  const struct {
+    const char* hardware;
+    const char* firstLine;
+    int exitCode;
+  } cases[] = {
+      {"", "hardware: serial port COM1 at /nonexistent/tty", 1},
+      {"config", "hardware: serial port COM1 at /nonexistent/tty", 1},
+      {"sim", "hardware: simulated KR80 bench", 0},
+  };
+  std::filesystem::remove(settings_);
+  settings_ = dir_.Write("ports.ini",
+                         "[Components\\Faultbox.Component\\Hardware\\SerialPorts]\n"
+                         "COM1=/nonexistent/tty\n");
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.hardware);
+    std::vector<std::string> args = {"activate", doc, "Test", "--hold", "0"};
+    if (*c.hardware != '\0') args.insert(args.end(), {"--hardware", c.hardware});
+    const ProcessResult r = Run(args);
+    EXPECT_EQ(r.exitCode, c.exitCode) << r.out << r.err;
+    EXPECT_EQ(r.out.rfind(c.firstLine, 0), 0u) << r.out;
+    if (c.exitCode != 0) {
+      EXPECT_NE(r.out.find("not connected"), std::string::npos) << r.out;
+    }
+  }
+}
+
+// SIGTERM during an open-ended hold ends it the regular way: deactivated,
+// disconnected, status 0.
+TEST_F(HardwareCliRefusals, TerminationDuringTheHoldSwitchesBack) {
+  const std::string doc = Document();
+  test::BackgroundProcess run({"/usr/bin/env", "NORVIK_ROOT=" FAULTBOX_BINARY_DIR "/data/norvik",
+                               "FAULTBOX_CONFIG=" + settings_, FAULTBOX_CLI_PATH, "activate", doc, "Test",
+                               "--hardware", "sim"});
+  ASSERT_TRUE(run.Started());
+  std::string out, line;
+  while ((line = run.ReadLine()) != "holding until Ctrl-C") {
+    ASSERT_FALSE(line.empty()) << "no hold in:\n" << out;
+    out += line + "\n";
+  }
+  EXPECT_EQ(RelaysShown(out, "after activation"), kQuickBench.relaysOn) << out;
+  out.clear();
+  // Stop sends the signal and waits; the lines it printed are still readable.
+  const int status = run.Stop(SIGTERM);
+  while (!(line = run.ReadLine()).empty()) out += line + "\n";
+  EXPECT_EQ(status, 0) << out;
+  EXPECT_NE(out.find("deactivated Test"), std::string::npos) << out;
+  EXPECT_EQ(RelaysShown(out, "after deactivation"), kAllOff) << out;
+  EXPECT_NE(out.find("disconnected"), std::string::npos) << out;
+}
+
+// `make demo` as a new user sees it: it must run through, and its sessions
+// must show the relays switched and switched back.
+TEST(DemoScript, RunsThroughOnTheSimulatedBenches) {
+  const ProcessResult r =
+      test::RunProcess({"/bin/bash", FAULTBOX_SOURCE_DIR "/scripts/demo.sh", FAULTBOX_BINARY_DIR});
+  ASSERT_EQ(r.exitCode, 0) << r.out << r.err;
+  for (const char* line : {"relays after activation: LOAD 0x013: channel 1 relay 2 on; channel 2 relay 2 on",
+                           "relays after activation: FIU 0x11: relays 2 (state 2), 3 (state 8) on"})
+    EXPECT_NE(r.out.find(line), std::string::npos) << line << "\n" << r.out;
+  EXPECT_EQ(RelaysShown(r.out, "after deactivation"), kAllOff) << r.out;
+  // Progress notes are left out; nothing went wrong.
+  EXPECT_EQ(r.out.find("info "), std::string::npos) << r.out;
+  EXPECT_EQ(r.out.find("error "), std::string::npos) << r.out;
+  EXPECT_EQ(r.out.find("warning "), std::string::npos) << r.out;
+}
+
+}  // namespace
+}  // namespace faultbox
