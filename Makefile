@@ -10,7 +10,8 @@ JOBS       ?= $(shell nproc 2>/dev/null || echo 2)
 FUZZ_SECONDS ?= 20
 
 PACKAGES = cmake ninja-build g++ make libgtest-dev libgmock-dev libbenchmark-dev \
-           libcli11-dev nlohmann-json3-dev clang libclang-rt-dev
+           libcli11-dev nlohmann-json3-dev clang libclang-rt-dev \
+           pybind11-dev python3-dev python3-pytest
 
 .PHONY: all deps configure build demo test check test-asan fuzz clean
 
@@ -40,7 +41,7 @@ test: check test-asan fuzz
 
 test-asan: deps
 	cmake -S . -B $(ASAN_BUILD) -G Ninja -DFAULTBOX_WERROR=ON -DFAULTBOX_SANITIZE=ON -DFAULTBOX_BENCH=OFF \
-	  -DCMAKE_BUILD_TYPE=Debug
+	  -DFAULTBOX_PYTHON=OFF -DCMAKE_BUILD_TYPE=Debug
 	cmake --build $(ASAN_BUILD) -j $(JOBS)
 	ASAN_OPTIONS=detect_leaks=1 UBSAN_OPTIONS=print_stacktrace=1 \
 	  ctest --test-dir $(ASAN_BUILD) --output-on-failure -j $(JOBS)

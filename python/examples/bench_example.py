@@ -1,0 +1,81 @@
+#!/usr/bin/python3
+"""Inserts one failure on a HIL bench and takes it out again.
+
+Opens the bench's document, lists its failure classes, builds a pattern with
+one pin, activates it, checks the pin and deactivates. On the built-in
+simulator (the default) it also shows the relays the simulated bench switched.
+
+    PYTHONPATH=build/python NORVIK_ROOT=build/data/norvik \\
+        /usr/bin/python3 bench_example.py chassis.fsa A12 ECM 1
+"""
+
+import argparse
+import logging
+import sys
+
+import faultbox
+
+
+def run(document, pin_name, ecu_name, class_id, hardware="sim"):
+    """Runs the example on `document`; answers the simulated bench's relays
+    while the pattern was activated and after it was deactivated."""
+    root = faultbox.FaultInjection()
+    root.SelectHardware(hardware)  # extension: "sim" or "config"
+    system = root.Systems.Open(document)
+    relays = {}
+    try:
+        print(f"{system.Name}: {system.PlatformType.name}, pin file {system.PinFile}")
+
+        classes = system.FailureClasses
+        print(f"{len(classes)} failure classes ({classes.Version}):")
+        for failure_class in classes:
+            print(f"  {failure_class.ID:3}  {failure_class.Name}")
+
+        # A pattern of one pin (both calls are extensions of the model).
+        pattern = system.FailurePatterns.Add("Script example")
+        pin = pattern.Pins.Add(pin_name, ecu_name)
+        pin.SetFailureClass(class_id)
+        failure_class = pin.AdjustedFailureClass
+        print(f"pin {pin.Name} of {pin.EcuName}: class {failure_class.ID} ({failure_class.Name})")
+
+        system.Connect()
+        try:
+            pattern.Activate()
+            if not pin.IsActivated():
+                raise RuntimeError(f"pin {pin.Name} of {pin.EcuName} is not activated")
+            relays["activated"] = faultbox.sim_relays(system)  # extension
+            print("activated; relays:", "; ".join(relays["activated"]) or "(real hardware)")
+            # ... the test on the bench runs here ...
+        finally:
+            pattern.Deactivate()
+        print("deactivated; pin activated:", pin.IsActivated())
+        relays["deactivated"] = faultbox.sim_relays(system)
+        system.Disconnect()
+    finally:
+        # Refused while a pattern is still activated; the module then
+        # deactivates and disconnects at the interpreter's exit.
+        system.Close()
+    return relays
+
+
+def main():
+    parser = argparse.ArgumentParser(description=__doc__.splitlines()[0])
+    parser.add_argument("document", help="the bench's document (.fsa or .fss)")
+    parser.add_argument("pin", help="the pin's name")
+    parser.add_argument("ecu", help="the pin's ECU")
+    parser.add_argument("class_id", type=int, help="the failure class to insert")
+    parser.add_argument("--hardware", choices=["sim", "config"], default="sim")
+    args = parser.parse_args()
+
+    # The component's messages (message number and text) come through logging.
+    logging.basicConfig(level=logging.INFO, format="%(levelname)s %(name)s %(message)s")
+    try:
+        run(args.document, args.pin, args.ecu, args.class_id, args.hardware)
+    except faultbox.FaultboxError as error:
+        print(f"failed: {error.description} ({getattr(error.hresult, 'name', hex(error.hresult))})")
+        return 1
+    return 0
+
+
+if __name__ == "__main__":
+    sys.exit(main())

@@ -1,0 +1,146 @@
+// The Python module `faultbox`: the automation object model for test
+// scripts, reported messages as Python logging records, and an orderly end
+// at the interpreter's exit.
+#include <atomic>
+
+#include "ModuleSupport.h"
+#include "ScriptHardware.h"
+#include "automation/QFCFailurePatternImpl.h"
+#include "automation/QFCFailurePatternsImpl.h"
+#include "automation/QFCSystemImpl.h"
+#include "automation/QFCSystemsImpl.h"
+#include "host/QFCFaultboxApp.h"
+#include "platform/ErrorModule.h"
+
+namespace faultbox::python {
+
+namespace {
+
+constexpr const char* kLoggerName = "faultbox";
+
+// Hands every reported message to the logger "faultbox". It may run on any
+// thread, with or without the GIL: a call in progress has released it.
+class LoggingSink : public MessageSink {
+ public:
+  void Display(const ErrorRecord& record, bool show) override {
+    if (closed_.load()) return;
+    py::gil_scoped_acquire gil;
+    try {
+      py::object logging = py::module_::import("logging");
+      const char* level = record.errorClass == 3   ? "ERROR"
+                          : record.errorClass == 2 ? "WARNING"
+                          : record.errorClass == 1 ? "INFO"
+                                                   : "DEBUG";
+      py::dict extra;
+      extra["number"] = record.number;
+      extra["texts"] = py::make_tuple(ToText(record.first), ToText(record.second));
+      extra["show"] = show;
+      logging.attr("getLogger")(kLoggerName)
+          .attr("log")(logging.attr(level), "%d: %s", record.number, ToText(record.Text()),
+                       py::arg("extra") = extra);
+    } catch (py::error_already_set& error) {
+      // A failing handler must not fail the member that reported.
+      error.discard_as_unraisable("faultbox: passing a message to logging");
+    }
+  }
+  void Close() { closed_.store(true); }
+
+ private:
+  std::atomic<bool> closed_{false};
+};
+
+// Both live until the process ends: the sink may be called from a thread
+// after the module's objects are gone.
+LoggingSink* g_sink = nullptr;
+std::shared_ptr<ScriptRoot>* g_root = nullptr;
+
+// Leaves no relay switched and no system connected, then discards the
+// documents and the simulated benches behind them.
+void ShutDown() {
+  if (g_root == nullptr || !(*g_root)->impl) return;
+  {
+    py::gil_scoped_release release;
+    std::lock_guard<std::recursive_mutex> lock(ModelMutex());
+    QFCFaultInjectionImpl& root = *(*g_root)->impl;
+    std::shared_ptr<QFCSystemsImpl> systems;
+    std::int32_t count = 0;
+    if (Succeeded(root.get_Systems(systems)) && Succeeded(systems->get_Count(count))) {
+      for (std::int32_t i = 0; i < count; ++i) {
+        std::shared_ptr<QFCSystemImpl> system;
+        if (Failed(systems->Item(Variant{std::int64_t{i}}, system))) continue;
+        std::shared_ptr<QFCFailurePatternsImpl> patterns;
+        std::shared_ptr<QFCBaseFailurePatternImpl> active;
+        if (Succeeded(system->get_FailurePatterns(patterns)) &&
+            Succeeded(patterns->get_ActivatedFailurePattern(active)) && active) {
+          BenchOperation operation(system->GetOwner());
+          operation.Done(Succeeded(active->Deactivate()));
+          VARIANT_BOOL still = VARIANT_FALSE;
+          // A bench that did not take the deactivation is reset instead.
+          if (Succeeded(active->IsActivated(still)) && still != VARIANT_FALSE) system->ResetHardware();
+        }
+        VARIANT_BOOL connected = VARIANT_FALSE;
+        if (Succeeded(system->IsConnected(connected)) && connected != VARIANT_FALSE) system->Disconnect();
+      }
+    }
+    (*g_root)->impl.reset();
+    ReleaseScriptHardware();
+  }
+  if (g_sink != nullptr) {
+    if (ErrorModule* module = TheApp().Module()) module->RemoveSink(g_sink);
+    g_sink->Close();
+  }
+}
+
+std::shared_ptr<ScriptRoot> FaultInjection() {
+  if (g_root != nullptr) return *g_root;
+  g_root = new std::shared_ptr<ScriptRoot>(std::make_shared<ScriptRoot>());
+  {
+    py::gil_scoped_release release;
+    std::lock_guard<std::recursive_mutex> lock(ModelMutex());
+    (*g_root)->impl = QFCFaultInjectionImpl::Create();
+    InstallScriptHardware();
+    if (ErrorModule* module = TheApp().Module()) {
+      g_sink = new LoggingSink;
+      module->AddSink(g_sink);
+    }
+  }
+  // logging was imported first, so its own exit handler (which flushes and
+  // closes the handlers) runs after this one and the last messages get out.
+  py::module_::import("atexit").attr("register")(py::cpp_function(&ShutDown));
+  return *g_root;
+}
+
+}  // namespace
+
+}  // namespace faultbox::python
+
+PYBIND11_MODULE(faultbox, m) {
+  using namespace faultbox;
+  using namespace faultbox::python;
+  m.doc() =
+      "Failure insertion on HIL test benches from Python: the automation object model.\n\n"
+      "faultbox.FaultInjection() gives the root object; docs/python.md is the guide.";
+  py::module_::import("logging");
+
+  AddErrorsAndConstants(m);
+  AddModelClasses(m);
+
+  m.def("FaultInjection", &FaultInjection,
+        "The root object. The first call starts the component; every call gives the same object.");
+
+  m.def(
+      "sim_relays",
+      [](QFCSystemImpl& system) {
+        std::vector<std::string> lines;
+        Invoke([&] {
+          QFCAutomationCall frame;
+          if (system.GetOwner() == nullptr) return frame.Detached(system.GetKeptText());
+          lines = SimulatedRelays(*system.GetOwner());
+          return frame.Return(FAULTBOX_OK);
+        });
+        return ToTextList(lines);
+      },
+      py::arg("system"),
+      "Extension: the relays that are on in the built-in simulated bench of `system`, one line per module, "
+      "or [\"all relays off\"]; [] when the system runs on the settings' hardware.");
+}
