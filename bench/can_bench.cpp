@@ -35,6 +35,7 @@
 #include "platform/CanAccess.h"
 #include "platform/Settings.h"
 #include "systems/QFCSystem.h"
+#include "SimulatedRig.h"
 
 namespace {
 
@@ -82,42 +83,15 @@ std::string UniqueBus() {
 // A KR60 system of kPins pins on an in-process bus shared with the simulated
 // bench of the same pin file, connected through its CAN transfer interface,
 // and one pattern holding every pin with a failure class chosen and selected.
-class Rig {
+class Rig : public bench::SimulatedRig<sim::KR60Simulator> {
  public:
   explicit Rig(bool timing) { error_ = Build(timing); }
-  ~Rig() {
-    if (system_ && system_->GetTransferInterface()) system_->GetTransferInterface()->Connect(false, 0, 0);
-    system_.reset();
-    if (sim_) sim_->Stop();
-    CanChannelTable::SetOverride({});
-    Settings::SetPathOverride("");
-    fs::remove_all(dir_, ignored_);
-  }
-
-  // Empty when the rig is ready.
-  const std::string& error() const { return error_; }
-  QFCAbstractFailurePattern& pattern() { return *pattern_; }
-  sim::KR60Simulator& sim() { return *sim_; }
 
  private:
   // What went wrong, or "".
   std::string Build(bool timing) {
-    dir_ = fs::temp_directory_path() / ("faultbox-bench-can-" + std::to_string(::getpid()));
-    fs::remove_all(dir_, ignored_);
-    fs::create_directories(dir_);
-    Settings::SetPathOverride((dir_ / "faultbox.ini").string());
-    Settings::SetString(Settings::kComponentSection, "Timeout", kPatientTimeout);
-
-    auto classes = QFCAbstractFailureClasses::Create(fptKR60Platform);
-    classes->SetVersion("bench");
-    FillClasses(*classes);
-    const auto bytes = StoreFailureClasses(*classes);
-    std::ofstream((dir_ / "classes.fcd").string(), std::ios::binary)
-        .write(reinterpret_cast<const char*>(bytes.data()), static_cast<std::streamsize>(bytes.size()));
-
-    const std::string pinFile = (dir_ / "bench.csv").string();
-    std::ofstream(pinFile, std::ios::binary) << PinFileText();
-
+    const std::string pinFile = PrepareFolder("faultbox-bench-can-" + std::to_string(::getpid()),
+                                              kPatientTimeout, fptKR60Platform, FillClasses, PinFileText());
     const std::string target = "virtual:" + UniqueBus();
     sim::KR60SimulatorOptions options;
     options.pinFile = pinFile;
@@ -130,30 +104,13 @@ class Rig {
     if (!ParseCanChannelTarget(target, &parsed)) return "no channel target " + target;
     CanChannelTable::SetOverride({{{-1, -1, -1}, parsed}});
 
-    system_ = std::make_unique<QFCSystem>("Bench", pinFile, 1, "", "");
-    if (system_->OpenFromPinFile() != FAULTBOX_OK || system_->GetFailureClasses() == nullptr)
-      return "the system could not be opened from the pin file";
-    FillClasses(*system_->GetFailureClasses());
+    if (std::string failed = OpenSystem(pinFile, FillClasses); !failed.empty()) return failed;
     if (system_->GetTransferInterface() == nullptr ||
         system_->GetTransferInterface()->Connect(true, 0, 0) != FAULTBOX_OK)
       return "the CAN transfer interface could not connect to " + target;
     // What a hardware reset would have found: every LOAD module answers.
     for (int m = 0; m < kModules; ++m) system_->GetRespondingModules().insert(ModuleAddress(m));
-
-    // The pattern's pins in pin file order, the classes taking turns.
-    std::vector<QFCAbstractPin*> pins;
-    for (QFCECU* ecu : system_->GetECUs())
-      for (int i = 0; i < ecu->GetPinCount(); ++i) pins.push_back(ecu->GetPin(i));
-    const bool created = system_->CreatePattern("Bench", pattern_) == FAULTBOX_OK && pattern_ != nullptr;
-    if (!created || !pattern_->AddPins(pins) || pattern_->GetPinCount() != kPins)
-      return "no pattern holds all pins";
-    int next = 0;
-    for (const auto& pin : pattern_->GetPins()->GetList()) {
-      if (pattern_->SetFailureClass(pin.get(), next++ % 3 + 1, 0) != FAULTBOX_OK)
-        return pin->GetPinName() + " takes no failure class";
-    }
-    pattern_->SelectAllPins(true);
-    return "";
+    return BuildPattern(kPins);
   }
 
   // FIU and RSIM modules are fitted, though these classes switch neither.
@@ -194,12 +151,6 @@ class Rig {
     return text + "/SignallistEnd\r\n";
   }
 
-  fs::path dir_;
-  std::error_code ignored_;
-  std::string error_;
-  std::unique_ptr<sim::KR60Simulator> sim_;
-  std::unique_ptr<QFCSystem> system_;
-  QFCAbstractFailurePattern* pattern_ = nullptr;
 };
 
 // The frames that activate the whole pattern, built and destroyed again.

@@ -29,6 +29,7 @@
 #include "platform/SerialPort.h"
 #include "platform/Settings.h"
 #include "systems/QFCSystem.h"
+#include "SimulatedRig.h"
 
 namespace {
 
@@ -70,41 +71,15 @@ void FillClasses(QFCAbstractFailureClasses& classes) {
 // A KR40 system of kPins pins, every relay of modules 0x10 ... 0x19 used
 // once, its port COM1 leading to a timed simulator of the same pin file, and
 // one pattern holding every pin with a failure class chosen and selected.
-class Rig {
+class Rig : public bench::SimulatedRig<sim::KR40Simulator> {
  public:
   Rig() { error_ = Build(); }
-  ~Rig() {
-    if (system_ && system_->GetTransferInterface()) system_->GetTransferInterface()->Connect(false, 0, 0);
-    system_.reset();
-    if (sim_) sim_->Stop();
-    Settings::SetPathOverride("");
-    fs::remove_all(dir_, ignored_);
-  }
-
-  // Empty when the rig is ready.
-  const std::string& error() const { return error_; }
-  QFCAbstractFailurePattern& pattern() { return *pattern_; }
-  sim::KR40Simulator& sim() { return *sim_; }
 
  private:
   // What went wrong, or "".
   std::string Build() {
-    dir_ = fs::temp_directory_path() / "faultbox-bench-serial";
-    fs::remove_all(dir_, ignored_);
-    fs::create_directories(dir_);
-    Settings::SetPathOverride((dir_ / "faultbox.ini").string());
-    Settings::SetString(Settings::kComponentSection, "Timeout", kPatientTimeout);
-
-    auto classes = QFCAbstractFailureClasses::Create(1);
-    classes->SetVersion("bench");
-    FillClasses(*classes);
-    const auto bytes = StoreFailureClasses(*classes);
-    std::ofstream((dir_ / "classes.fcd").string(), std::ios::binary)
-        .write(reinterpret_cast<const char*>(bytes.data()), static_cast<std::streamsize>(bytes.size()));
-
-    const std::string pinFile = (dir_ / "bench.csv").string();
-    std::ofstream(pinFile, std::ios::binary) << PinFileText();
-
+    const std::string pinFile =
+        PrepareFolder("faultbox-bench-serial", kPatientTimeout, 1, FillClasses, PinFileText());
     sim::KR40SimulatorOptions options;
     options.protocol = sim::ProtocolForBoardType("KR40");
     options.pinFile = pinFile;
@@ -114,10 +89,7 @@ class Rig {
     if (!sim_) return "the simulator did not start: " + error;
     Settings::SetString(SerialPort::kPortSection, "COM1", sim_->PortPath());
 
-    system_ = std::make_unique<QFCSystem>("Bench", pinFile, 1, "", "");
-    if (system_->OpenFromPinFile() != FAULTBOX_OK || system_->GetFailureClasses() == nullptr)
-      return "the system could not be opened from the pin file";
-    FillClasses(*system_->GetFailureClasses());
+    if (std::string failed = OpenSystem(pinFile, FillClasses); !failed.empty()) return failed;
     if (system_->GetSerialSettings().portName != "COM1") return "the system's port is not COM1";
     if (system_->GetTransferInterface() == nullptr ||
         system_->GetTransferInterface()->Connect(true, 0, 0) != FAULTBOX_OK)
@@ -125,19 +97,7 @@ class Rig {
     // What a hardware reset would have found: every module of the pin file answers.
     for (int m = 0; m < kPins / kRelaysPerModule; ++m)
       system_->GetRespondingModules().insert(static_cast<std::uint16_t>(kFirstModule + m));
-
-    if (system_->CreatePattern("Bench", pattern_) != FAULTBOX_OK || pattern_ == nullptr)
-      return "the pattern could not be created";
-    std::vector<QFCAbstractPin*> pins;
-    for (QFCECU* ecu : system_->GetECUs())
-      for (int i = 0; i < ecu->GetPinCount(); ++i) pins.push_back(ecu->GetPin(i));
-    if (!pattern_->AddPins(pins) || pattern_->GetPinCount() != kPins)
-      return "the pattern does not hold all pins";
-    for (int i = 0; i < kPins; ++i)
-      if (pattern_->SetFailureClass(pattern_->GetPinAt(i), i % 3 + 1, 0) != FAULTBOX_OK)
-        return "pin " + std::to_string(i) + " takes no failure class";
-    pattern_->SelectAllPins(true);
-    return "";
+    return BuildPattern(kPins);
   }
 
   static std::string PinFileText() {
@@ -157,12 +117,6 @@ class Rig {
     return out.str();
   }
 
-  fs::path dir_;
-  std::error_code ignored_;
-  std::string error_;
-  std::unique_ptr<sim::KR40Simulator> sim_;
-  std::unique_ptr<QFCSystem> system_;
-  QFCAbstractFailurePattern* pattern_ = nullptr;
 };
 
 std::size_t RelayCount(const sim::KR40RelayStates& states) {
