@@ -9,7 +9,7 @@ JOBS       ?= $(shell nproc 2>/dev/null || echo 2)
 # Seconds each fuzz target runs during `make test`.
 FUZZ_SECONDS ?= 20
 
-PACKAGES = cmake ninja-build g++ make libgtest-dev libgmock-dev libbenchmark-dev \
+PACKAGES = cmake ninja-build g++ make libgtest-dev libgmock-dev libbenchmark-dev ccache \
            libcli11-dev nlohmann-json3-dev clang libclang-rt-dev \
            pybind11-dev python3-dev python3-pytest
 
