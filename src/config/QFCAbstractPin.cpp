@@ -194,8 +194,9 @@ int QFCAbstractPin::EnsureFailureClasses() {
           i = j;
           if (!closed) break;  // an entry whose ")" never comes is dropped
         }
-        // An empty entry ("1,,2" or a trailing comma) would otherwise read as ID 0.
-        if (entry.empty() || Failed(CheckFailureClassEntry(entry))) {
+        // An empty entry ("1,,2" or a trailing comma) is the platform's to
+        // judge: both read it as ID 0, which no failure class has.
+        if (Failed(CheckFailureClassEntry(entry))) {
           ReportInvalid(kFailureClassLabel, entry);
           outcome = kMissing;
           break;
@@ -203,9 +204,9 @@ int QFCAbstractPin::EnsureFailureClasses() {
         entries.push_back(std::move(entry));
       }
     }
-    // A refused entry leaves no half list behind: the pin offers all its
-    // entries or none.
-    failureClasses_ = outcome == kPresent ? std::move(entries) : std::vector<std::string>();
+    // A refused entry ends the list; the entries before it stay, so a KR60
+    // pin still offers them (a KR40 pin refuses its line on the outcome).
+    failureClasses_ = std::move(entries);
     failureClassOutcome_ = outcome;
   }
   return failureClassOutcome_;

@@ -50,9 +50,10 @@ bool QFCKR60Pin::ParseFailureClassEntry(std::string_view entry, std::uint32_t& i
   parameters.clear();
   const std::size_t open = entry.find('(');
   const std::size_t close = entry.find(')');
-  if (open == std::string_view::npos && close == std::string_view::npos) {
-    return !entry.empty() && QFCFSHelper::StringToNumber(entry, id, 10);
-  }
+  // An empty entry ("1,,2", or a trailing comma) reads as ID 0, as benches'
+  // pin files have long relied on; no failure class has that ID.
+  if (open == std::string_view::npos && close == std::string_view::npos)
+    return QFCFSHelper::StringToNumber(entry, id, 10);
   // Both brackets, in order, the list closing the entry.
   if (open == std::string_view::npos || close != entry.size() - 1 || close < open) return false;
   const std::string_view idText = entry.substr(0, open);
@@ -120,9 +121,14 @@ HRESULT QFCKR60Pin::Validate() {
   if (requiredState == kNotUsed) return W_FAULTBOX_PIN_NOT_USED_FOR_FAULT_INJECTION;
   std::uint32_t required = 0;
   if (requiredState == kPresent) {
-    // A text that is no number refuses the line like one out of range: a
-    // typo must not silently drop the pin as "not used".
-    if (!QFCFSHelper::StringToNumber(text, required, 10) || required > kMaxChannelsRequired) {
+    // A text that is no number is reported and leaves the count at 0, so the
+    // line is dropped as not used and the rest of the file still loads;
+    // existing pin files rely on that. A number out of range refuses the line.
+    if (!QFCFSHelper::StringToNumber(text, required, 10)) {
+      ReportInvalid(kChannelsRequired, text);
+      return W_FAULTBOX_PIN_NOT_USED_FOR_FAULT_INJECTION;
+    }
+    if (required > kMaxChannelsRequired) {
       ReportInvalid(kChannelsRequired, text);
       return E_FAULTBOX_CONSISTENCY_CHECK;
     }
@@ -162,13 +168,14 @@ HRESULT QFCKR60Pin::Validate() {
     if (!channelsRead) ReportInvalid(kModuleChannel, bad);
   }
   if (!channelsRead) ReportInvalid(kModuleChannel, channelText);
+  // The count is checked on the channels read before a bad item: a line whose
+  // readable channels make up the count stays, reported, as existing pin
+  // files rely on.
   if (static_cast<std::uint32_t>(std::popcount(channels)) != required) {
     TheApp().ReportError(42, kModuleId, DetailText(channelText));
     return E_FAULTBOX_CONSISTENCY_CHECK;
   }
-  // A channel list that could not be read completely refuses the line even
-  // when the channels read before the bad item happen to make up the count.
-  return channelsRead ? FAULTBOX_OK : E_FAULTBOX_CONSISTENCY_CHECK;
+  return FAULTBOX_OK;
 }
 
 }  // namespace faultbox

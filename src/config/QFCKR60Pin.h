@@ -32,7 +32,7 @@ class QFCKR60Pin : public QFCAbstractPin {
   int GetLoadModuleChannels(std::vector<std::uint32_t>& list) const;
 
   // Splits an entry "ID" or "ID(p1,p2,...)" into its numbers; false when it
-  // has another form.
+  // has another form. An empty entry is ID 0.
   static bool ParseFailureClassEntry(std::string_view entry, std::uint32_t& id,
                                      std::vector<std::uint32_t>& parameters);
 };

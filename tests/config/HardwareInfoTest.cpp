@@ -145,6 +145,21 @@ const LoadCase kLoadCases[] = {
      {114, 146}, {{114, -1, "P2", "Value: P2, pin name: P2, ECU name: ECU_A, File name: bench.csv"}}},
     // A pin that fails its own checks fails the load.
     {"BadModuleId", false, Pin(0, "P1;ECU_A;1;80;1;S"), kCheck, {37, 35, 146}},
+    // Values that benches' pin files hold are reported, and the file loads.
+    {"KR40EmptyFailureClassEntries", false,
+     [](auto& t) { t.pins[0] = "P1;ECU_A;1,,2;7F;1;S"; t.pins[1] = "P2;ECU_A;1,2,;1;2;S"; }, FAULTBOX_OK, {},
+     {}, 3},
+    {"KR60ReportedValuesStillLoad", true,
+     [](auto& t) {
+       t.pins.push_back("P3;ECU_A;4,x,5;1;0_1_2;4");    // the entries before "x" stay
+       t.pins.push_back("P4;ECU_A;1;two;0_1_2;5");      // dropped as not used
+       t.pins.push_back("P5;ECU_A;1,,2;1;0_1_2;6,x");   // the channel read makes up the count
+       t.pins.push_back("P6;ECU_A;1,2,;1;0_1_2;7");
+     },
+     FAULTBOX_OK, {37, 37, 37, 37},
+     {{37, 3, "faults_ecu", nullptr}, {37, 3, "load_channels_required", nullptr},
+      {37, 3, "load_module_channel", nullptr}},
+     5},
     {"SignallistTooShortForHeader", false,
      [](auto& t) { t.signallistTag = "/Signallist;\r\n/SignallistEnd;"; t.pins.clear(); }, kCheck, {35}},
 };

@@ -102,7 +102,8 @@ TEST(KR40PinTest, Validate) {
       {KR40Columns("1", "11"), kCheck, {37, 35}, "fiu_module_channel"},
       {KR40Columns("80", "11"), kCheck, {37, 37, 35}, "fiu_module_id"},
       {KR40Columns("-", "1"), kCheck, {41}, "fiu_module_id"},
-      {KR40Columns("1", "1", "1,,2"), kCheck, {37}, "faults_ecu"},
+      {KR40Columns("1", "1", "1,,2"), FAULTBOX_OK, {}},  // the empty entry reads as ID 0
+      {KR40Columns("1", "1", "1,x"), kCheck, {37}, "faults_ecu"},
       {KR40Columns("1", "1", "-"), kNotUsed, {}},
       {{{"pin_name(1)", "#"}, {"ecu_name(1)", "ECU"}, {"faults_ecu(1)", "1"}}, kNotUsed, {}},
       {{{"pin_name(1)", "P"}, {"ecu_name(1)", "-"}, {"faults_ecu(1)", "1"}}, kCheck, {41}, "ecu_name"},
@@ -127,12 +128,12 @@ TEST(KR60PinTest, Validate) {
       {KR60Columns("-", "1_2_3", "3"), kNotUsed, {}},
       {KR60Columns("0", "1_2_3", "3"), kNotUsed, {}},
       {KR60Columns("10", "1_2_3", "3"), kCheck, {37}, "load_channels_required"},
-      {KR60Columns("two", "1_2_3", "3"), kCheck, {37}, "load_channels_required"},
+      {KR60Columns("two", "1_2_3", "3"), kNotUsed, {37}, "load_channels_required"},
       {KR60Columns("1", "10_0_0", "3"), kCheck, {34, 37, 35}, "cabinet"},
       {KR60Columns("1", "1_2_3", "-"), kCheck, {41}, "load_module_channel"},
       {KR60Columns("1", "1_2_3", "10"), kCheck, {37, 37, 42}, "load_module_channel"},
-      // The channel read before the bad item makes up the count: still refused.
-      {KR60Columns("1", "1_2_3", "3,x"), kCheck, {37, 37}, "load_module_channel"},
+      // The count is checked on the channels read before the bad item.
+      {KR60Columns("1", "1_2_3", "3,x"), FAULTBOX_OK, {37, 37}, "load_module_channel"},
       {KR60Columns("2", "1_2_3", "3,,4"), kCheck, {37, 37, 42}, "load_module_channel"},
       // Refused failure class entries are reported; the pin stays.
       {KR60Columns("1", "1_2_3", "3", "x"), FAULTBOX_OK, {37}, "faults_ecu"},
@@ -161,7 +162,9 @@ TEST(PinTest, FailureClassEntries) {
       {true, "3(1,2)x", QFCAbstractPin::kMissing, {}, 1},
       {true, "(1)", QFCAbstractPin::kMissing, {}, 1},
       {true, "3()", QFCAbstractPin::kMissing, {}, 1},
-      {true, "1,", QFCAbstractPin::kMissing, {}, 1},
+      {true, "1,", QFCAbstractPin::kPresent, {"1", ""}, 0},
+      {false, "1,,2", QFCAbstractPin::kPresent, {"1", "", "2"}, 0},
+      {true, "4,x,5", QFCAbstractPin::kMissing, {"4"}, 1},
       {false, "3(1,2),5", QFCAbstractPin::kMissing, {}, 1},
       {false, "#", QFCAbstractPin::kNotUsed, {}, 0},
   };
