@@ -132,7 +132,9 @@ bool ReadPinFile(const KR60SimulatorOptions& options, std::optional<std::uint32_
   if (!offset) {
     if (NotFitted(text) || !QFCFSHelper::StringToNumber(text, number, 16))
       return Fail(error, "pin file " + file + " gives no OffsetLoadAddress (\"" + value + "\")");
-    offset = number;
+    // The host sends only the offset's low 11 bits, whatever the pin file
+    // says; the bench answers under those.
+    offset = number & kOffsetBits;
   }
   std::optional<std::uint32_t> fiu, rsim;
   if (!ReadLoadModule("FIULoadAddress", info.GetFIULoadModule(), file, fiu, error) ||

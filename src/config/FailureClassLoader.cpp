@@ -19,6 +19,7 @@ constexpr int kMsgRootNotSet = 158;
 constexpr int kMsgCannotOpen = 80;
 constexpr int kMsgCannotRead = 81;
 constexpr int kMsgWrongPlatform = 168;
+constexpr int kShown = 1;
 constexpr int kPlaceCreateCollection = 304;
 
 // The platform type a file names in its header, or 0 when the header cannot
@@ -37,10 +38,11 @@ std::int32_t PeekPlatform(const std::vector<std::uint8_t>& bytes) {
 }  // namespace
 
 std::string DefaultFailureClassFile(std::int32_t platform, const std::string& boardType) {
-  if (platform == kFailureClassPlatformKR60) return "\\Cockpit\\Users\\AllUsers\\FailureClassesKR60.fcd";
-  if (boardType == "KR80" || boardType == "KR080")
-    return "\\Cockpit\\Users\\AllUsers\\FailureClassesKR80.fcd";
-  return "\\Cockpit\\Users\\AllUsers\\FailureClassesKR40.fcd";
+  // Written with '/': the path is shown to the user and stored in documents,
+  // and on Linux that is the separator people read and type.
+  if (platform == kFailureClassPlatformKR60) return "/Cockpit/Users/AllUsers/FailureClassesKR60.fcd";
+  if (boardType == "KR80" || boardType == "KR080") return "/Cockpit/Users/AllUsers/FailureClassesKR80.fcd";
+  return "/Cockpit/Users/AllUsers/FailureClassesKR40.fcd";
 }
 
 std::unique_ptr<QFCAbstractFailureClasses> ReadFailureClasses(std::vector<std::uint8_t> bytes,
@@ -94,7 +96,7 @@ HRESULT LoadFailureClasses(const std::string& fileName, std::int32_t platform, c
   std::optional<std::vector<std::uint8_t>> bytes;
   if (openable) bytes = ReadWholeFile(native);
   if (!bytes) {
-    app.ReportError(kMsgCannotOpen, path);
+    app.ReportError(kMsgCannotOpen, path, {}, kShown);
     return E_FAULTBOX_CANN_NOT_OPEN_FILE;
   }
 

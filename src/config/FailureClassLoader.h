@@ -18,7 +18,7 @@ constexpr const char* kFailureClassRootVariable = "NORVIK_ROOT";
 constexpr const char* kDefaultFailureClassFileName = "none";
 
 // The default file of a platform, to be appended to the NORVIK_ROOT folder:
-// "\Cockpit\Users\AllUsers\FailureClassesKR60.fcd" for platform 2, the KR80
+// "/Cockpit/Users/AllUsers/FailureClassesKR60.fcd" for platform 2, the KR80
 // file for a KR40-family board "KR80" or "KR080", the KR40 file otherwise.
 std::string DefaultFailureClassFile(std::int32_t platform, const std::string& boardType);
 
@@ -26,8 +26,8 @@ std::string DefaultFailureClassFile(std::int32_t platform, const std::string& bo
 // the platform's default file below NORVIK_ROOT (message 157 names it; an
 // unset or empty variable gives message 158, the path stays "none" and the
 // load fails with message 80 without looking for a file of that name).
-// `pathUsed` receives the path as formed, with the backslashes of the default
-// file kept; when opening, '\' counts as a folder separator.
+// `pathUsed` receives the path as formed; when opening, '\' counts as a
+// folder separator too.
 // Results: FAULTBOX_OK with the collection in `out`; E_FAULTBOX_CANN_NOT_OPEN_FILE
 // when the file cannot be opened or is no regular file (message 80) or read (message 81 with the
 // cause text and the path); E_FAULTBOX_CONSISTENCY_CHECK when the file is of

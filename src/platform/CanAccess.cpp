@@ -538,9 +538,10 @@ CanResult TransmitMessage(CanHandle handle, const CanFrameRecord& frame) {
   CanFrameRecord f = frame;
   f.timeStamp = CanTimeStampNow();
   std::string error;
+  if (traced) CanFrameTrace::BeginSend();
   const CanResult r = driverChannel->Transmit(f, &error);
+  if (traced) CanFrameTrace::EndSend(f, traceName, r == CanResult::kOk);
   if (r != CanResult::kOk) return Fail("TransmitMessage", r, busKey + ": " + error);
-  if (traced) CanFrameTrace::Write(f, traceName);
   return CanResult::kOk;
 }
 

@@ -257,7 +257,15 @@ class CanFrameTrace {
   static std::string FormatLine(const CanFrameRecord& frame, std::string_view interfaceName);
   static void Configure();
   static bool IsOn();
+  // Writes the line of a frame taken in. While a send is under way its line
+  // waits until the sent frame's line is written, so that an answer never
+  // stands before its request (a receiving thread may see the answer before
+  // the sending one returns).
   static void Write(const CanFrameRecord& frame, std::string_view interfaceName);
+  // Around a transmission: EndSend writes the frame's line when it was sent,
+  // then the lines of the frames taken in meanwhile.
+  static void BeginSend();
+  static void EndSend(const CanFrameRecord& frame, std::string_view interfaceName, bool sent);
 };
 
 // ---------------------------------------------------------------- operations

@@ -224,10 +224,13 @@ void QFCSystemProperty::StoreProperties(Archive& ar) const {
 
 void QFCSystemProperty::LoadProperties(Archive& ar) {
   // The pin file's entry stays in force; a document that names another file
-  // only warns. Case does not count (the file may have been named on Windows),
-  // but the current name keeps its case, since Linux opens it with that case.
+  // only warns. Case and the kind of separator do not count (the file may
+  // have been named on Windows, and older documents hold the default file
+  // with '\\'), but the current name keeps its case, since Linux opens it
+  // with that case.
   const std::string storedFile = ar.ReadString();
-  if (!QFCFSHelper::EqualNoCase(storedFile, failureClassFile_))
+  if (!QFCFSHelper::EqualNoCase(QFCFileHelper::ToNative(storedFile),
+                                QFCFileHelper::ToNative(failureClassFile_)))
     TheApp().ReportWarning(kMsgFailureClassFileDiffers, storedFile, failureClassFile_);
 
   // Stored in the order first, third, second.

@@ -282,7 +282,7 @@ TEST(FailureClassLoaderTest, DefaultFilesBelowNorvikRoot) {
     std::unique_ptr<QFCAbstractFailureClasses> out;
     std::string used;
     ASSERT_EQ(LoadFailureClasses("none", c.platform, c.board, &out, &used), FAULTBOX_OK);
-    const std::string expected = dir.Path() + "\\Cockpit\\Users\\AllUsers\\FailureClasses" + c.file + ".fcd";
+    const std::string expected = dir.Path() + "/Cockpit/Users/AllUsers/FailureClasses" + c.file + ".fcd";
     EXPECT_EQ(used, expected);
     EXPECT_EQ(out->GetVersion(), c.file);
     ASSERT_EQ(cap.records.size(), 1u);

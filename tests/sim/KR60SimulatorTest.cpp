@@ -385,6 +385,8 @@ TEST(KR60Simulator, ModulesComeFromThePinFile) {
   test::TempDir dir;
   test::PinFileText text = BenchText();
   text.format[1] = "AdditionalFiles;extra.csv";
+  // Wider than the identifier's 11 bits: the host sends the low ones, 0x010.
+  text.format[9] = "OffsetLoadAddress;810";
   test::PinFileText extra = test::PinFileText::KR60();
   extra.format = {"BoardType;KR60"};
   extra.pins = {"P9;Brake;1;1;0_4_5;2"};

@@ -5,6 +5,8 @@
 #include <cstdio>
 #include <cstdlib>
 #include <mutex>
+#include <string>
+#include <vector>
 
 #include "platform/CanAccess.h"
 #include "platform/Settings.h"
@@ -21,6 +23,8 @@ struct Trace {
   std::string destination;  // "" off, "-" standard error, else a file path
   std::FILE* file = nullptr;
   std::atomic<bool> on{false};
+  int sending = 0;                // transmissions under way
+  std::vector<std::string> held;  // lines taken in meanwhile
 };
 
 Trace& TheTrace() {
@@ -89,9 +93,29 @@ bool CanFrameTrace::IsOn() {
 void CanFrameTrace::Write(const CanFrameRecord& frame, std::string_view interfaceName) {
   Trace& t = TheTrace();
   if (!t.on) return;
-  const std::string line = FormatLine(frame, interfaceName) + "\n";
+  std::string line = FormatLine(frame, interfaceName) + "\n";
   std::lock_guard lock(t.mutex);
-  if (t.file) std::fputs(line.c_str(), t.file);
+  if (t.sending > 0)
+    t.held.push_back(std::move(line));
+  else if (t.file)
+    std::fputs(line.c_str(), t.file);
+}
+
+void CanFrameTrace::BeginSend() {
+  Trace& t = TheTrace();
+  std::lock_guard lock(t.mutex);
+  ++t.sending;
+}
+
+void CanFrameTrace::EndSend(const CanFrameRecord& frame, std::string_view interfaceName, bool sent) {
+  Trace& t = TheTrace();
+  const std::string line = sent && t.on ? FormatLine(frame, interfaceName) + "\n" : std::string();
+  std::lock_guard lock(t.mutex);
+  if (t.file && !line.empty()) std::fputs(line.c_str(), t.file);
+  if (t.sending > 0 && --t.sending > 0) return;
+  for (const std::string& held : t.held)
+    if (t.file) std::fputs(held.c_str(), t.file);
+  t.held.clear();
 }
 
 }  // namespace faultbox
