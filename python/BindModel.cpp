@@ -418,6 +418,9 @@ void AddModelClasses(py::module_& m) {
       .def_property_readonly("DefinedFailureClasses", Get(&QFCBaseFailurePatternPinImpl::get_DefinedFailureClasses))
       .def_property_readonly("ModuleChannel", Get(&QFCBaseFailurePatternPinImpl::get_ModuleChannel))
       .def_property_readonly("PinConfig", Get(&QFCBaseFailurePatternPinImpl::get_PinConfig))
+      .def_property_readonly("RefusalReason", Get(&QFCBaseFailurePatternPinImpl::get_RefusalReason),
+                             "Extension: why the safety interlock left the pin without a failure class "
+                             "(\"\" while it holds one).")
       .def_property_readonly("AdjustedFailureClassID",
                              [](QFCBaseFailurePatternPinImpl& self) {
                                std::int32_t id = 0, relayVector = -1;

@@ -23,9 +23,9 @@ cd "$work"
 export FAULTBOX_CONFIG="$work/settings.ini"
 printf '[Components\\Faultbox.Component]\nTimeout=3000\n' >"$FAULTBOX_CONFIG"
 
-# Progress notes (info and note messages) would bury the story; warnings
-# and errors stay.
-faultbox() { "$fb" "$@" 2>&1 | sed -E '/^(info|note) [0-9]+: /d'; }
+# Warnings and errors show with the rest of the output; progress notes
+# (info and note messages) would bury the story and come only with --verbose.
+faultbox() { "$fb" "$@" 2>&1; }
 heading() { printf '\n== %s ==\n' "$1"; }
 # Shows the command as a user would type it, then runs it.
 run() {

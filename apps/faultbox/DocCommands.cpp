@@ -52,6 +52,8 @@ HRESULT EditDocument(const std::string& path, const DocumentChange& change) {
     if (!done.empty()) std::printf("%s\n", done.c_str());
     std::printf("saved %s\n", doc->GetPathName().c_str());
   } else {
+    // What the change ran into, such as the interlock's reason for a pin.
+    if (!done.empty()) std::printf("%s\n", done.c_str());
     std::printf("%s was not changed: %s\n", path.c_str(), ResultCodeText(result).c_str());
   }
   std::fflush(stdout);
@@ -199,13 +201,22 @@ HRESULT ShowDocument(const std::string& path, bool json) {
 // ---- ecu enable / disable ----
 
 HRESULT EnableEcu(QFCFaultboxDoc& doc, const std::string& name, bool enable, std::string& done) {
-  QFCECU* ecu = doc.GetSystem()->FindECU(name);
-  if (ecu == nullptr) {
+  // Additional pin files may list the ECU again; the document stores the
+  // state by name, so every ECU of that name takes it.
+  int count = 0;
+  for (QFCECU* ecu : doc.GetSystem()->GetECUs()) {
+    if (ecu->GetName() != name) continue;
+    // A refusal (read-only document, activated pattern) holds for every one
+    // of them, so it comes at the first, before anything changed.
+    if (!ecu->SetEnabled(enable, false)) return E_FAULTBOX;
+    ++count;
+  }
+  if (count == 0) {
     TheApp().ReportError(kMsgNoSuchEcu, name);
     return E_FAULTBOX_INVALID_PARAMETER;
   }
-  if (!ecu->SetEnabled(enable, false)) return E_FAULTBOX;
   done = "ECU " + name + (enable ? " enabled" : " disabled");
+  if (count > 1) done += " (in " + std::to_string(count) + " pin files)";
   return FAULTBOX_OK;
 }
 

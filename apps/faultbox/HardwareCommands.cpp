@@ -152,6 +152,14 @@ std::string PinListText(const std::vector<QFCAbstractFailurePatternPin*>& pins) 
   return out;
 }
 
+// One line per pin an activation left out, with the reason.
+void SayLeftOut(const std::vector<QFCAbstractFailurePatternPin*>& pins) {
+  for (const QFCAbstractFailurePatternPin* pin : pins) {
+    const std::string reason = pin->GetNotReadyReason();
+    Say("  " + PinText(*pin) + ": " + (reason.empty() ? "see the messages" : reason));
+  }
+}
+
 class Session {
  public:
   explicit Session(HardwareOptions options) : options_(std::move(options)) {}
@@ -242,11 +250,13 @@ class Session {
     // The model leaves out pins that are not ready and succeeds with the
     // rest; with none left, nothing was activated, and a script must hear so.
     if (Succeeded(result) && on.empty()) {
-      Say(name + " was not activated: no pin is ready (see the messages): " + PinListText(out));
+      Say(name + " was not activated: no pin is ready");
+      SayLeftOut(out);
       result = E_FAULTBOX;
     } else if (Succeeded(result)) {
       Say("activated " + name + ": " + PinListText(on));
-      if (!out.empty()) Say("left out (not ready, see the messages): " + PinListText(out));
+      if (!out.empty()) Say("left out:");
+      SayLeftOut(out);
     } else {
       Say(name + " was not activated: " + ResultCodeText(result));
     }

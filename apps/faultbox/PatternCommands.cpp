@@ -1,6 +1,7 @@
 // `faultbox pattern`: build the failure patterns of a document. Every command
 // loads the document, changes it with the model's own operations (so the
 // safety interlock and the read-only rule apply) and saves it atomically.
+#include <algorithm>
 #include <cstdio>
 #include <memory>
 #include <string>
@@ -18,6 +19,7 @@
 namespace faultbox::cli {
 namespace {
 
+constexpr int kMsgNameInUse = 87;
 constexpr int kMsgPatternActivated = 127;
 
 }  // namespace
@@ -56,6 +58,12 @@ QFCFailurePatternNode* FindFolder(QFCFailurePatternNode& folder, const std::stri
 
 HRESULT Create(QFCFaultboxDoc& doc, const PatternOptions& o, std::string& done) {
   QFCSystem& system = *doc.GetSystem();
+  // The model notes a name in use only as a class 0 note; here it is the
+  // reason the command fails.
+  if (!o.name.empty() && system.FindPattern(o.name) != nullptr) {
+    TheApp().ReportError(kMsgNameInUse);
+    return E_FAULTBOX_NAME_NOT_UNIQUE;
+  }
   QFCAbstractFailurePattern* pattern = nullptr;
   if (HRESULT result = system.CreatePattern(o.name, pattern); result != FAULTBOX_OK) return result;
   done = "created pattern " + pattern->GetName();
@@ -136,10 +144,39 @@ std::string Outcome(const QFCAbstractFailurePatternPin& pin) {
   std::string config;
   for (std::uint32_t entry : pin.GetPinConfig()) config += std::to_string(entry);
   std::string out = pin.GetEcuName() + " " + pin.GetPinName() + ": PinConfig " + config + ", ";
-  if (pin.GetFailureClassId() < 0) return out + "no failure class";
+  if (pin.GetFailureClassId() < 0) {
+    out += "no failure class";
+    return pin.GetRefusalReason().empty() ? out : out + ": " + pin.GetRefusalReason();
+  }
   return out + "failure class " + std::to_string(pin.GetFailureClassId()) + ", relay vector " +
          std::to_string(pin.GetRelayVectorIndex());
 }
+
+// A change to one pin may change the classes of others (the pattern's
+// external hardware cleared): each of them gets its line too.
+class OtherPinsWatch {
+ public:
+  explicit OtherPinsWatch(const QFCAbstractFailurePattern& pattern) {
+    for (const auto& pin : pattern.GetPins()->GetList())
+      before_.push_back({pin.get(), pin->GetFailureClassId(), pin->GetRelayVectorIndex()});
+  }
+  void Tell(const std::vector<QFCAbstractFailurePatternPin*>& named, std::string& done) const {
+    for (const Held& held : before_) {
+      if (std::find(named.begin(), named.end(), held.pin) != named.end()) continue;
+      if (held.pin->GetFailureClassId() == held.id && held.pin->GetRelayVectorIndex() == held.vector)
+        continue;
+      done += (done.empty() ? "" : "\n") + ("changed with it: " + Outcome(*held.pin));
+    }
+  }
+
+ private:
+  struct Held {
+    const QFCAbstractFailurePatternPin* pin;
+    std::int32_t id;
+    std::int32_t vector;
+  };
+  std::vector<Held> before_;
+};
 
 }  // namespace
 
@@ -148,6 +185,7 @@ HRESULT ConfigurePatternPins(QFCFaultboxDoc& doc, const PatternOptions& o, std::
   if (pattern == nullptr) return E_FAULTBOX_INVALID_PARAMETER;
   std::vector<QFCAbstractFailurePatternPin*> pins;
   if (!FindPatternPins(*pattern, o.pins, pins)) return E_FAULTBOX_INVALID_PARAMETER;
+  const OtherPinsWatch others(*pattern);
   for (QFCAbstractFailurePatternPin* pin : pins) {
     // An activated pin refuses the change without a message of its own.
     if (!pin->SetPinConfig(o.entry, static_cast<std::uint32_t>(o.value), true)) {
@@ -156,6 +194,7 @@ HRESULT ConfigurePatternPins(QFCFaultboxDoc& doc, const PatternOptions& o, std::
     }
     done += (done.empty() ? "" : "\n") + Outcome(*pin);
   }
+  others.Tell(pins, done);
   return FAULTBOX_OK;
 }
 
@@ -164,15 +203,18 @@ HRESULT SetPatternPinClass(QFCFaultboxDoc& doc, const PatternOptions& o, std::st
   if (pattern == nullptr) return E_FAULTBOX_INVALID_PARAMETER;
   std::vector<QFCAbstractFailurePatternPin*> pins;
   if (!FindPatternPins(*pattern, o.pins, pins)) return E_FAULTBOX_INVALID_PARAMETER;
+  const OtherPinsWatch others(*pattern);
   for (QFCAbstractFailurePatternPin* pin : pins) {
     // The user's explicit choice: the interlock treats the pin first and
     // exempts it from the exclusive-entry rule while the choice is applied.
     pin->SetExplicitChoice(true);
     const HRESULT result = pattern->SetFailureClass(pin, o.classId, o.relayVector);
     pin->SetExplicitChoice(false);
-    if (result != FAULTBOX_OK) return result;
+    // A refused class is explained by what the interlock left the pin with.
     done += (done.empty() ? "" : "\n") + Outcome(*pin);
+    if (result != FAULTBOX_OK) return result;
   }
+  others.Tell(pins, done);
   return FAULTBOX_OK;
 }
 

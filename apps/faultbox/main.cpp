@@ -4,6 +4,7 @@
 
 #include <cstdio>
 #include <iostream>
+#include <vector>
 
 #include "Cli.h"
 #include "host/QFCFaultboxApp.h"
@@ -25,12 +26,39 @@ const char* ClassWord(int errorClass, int number) {
   }
 }
 
+// How much the terminal shows: errors (internal faults among them) always,
+// warnings unless --quiet, information and notes only with --verbose.
+enum class Verbosity { kQuiet, kNormal, kVerbose };
+
 class TextSink : public MessageSink {
  public:
+  explicit TextSink(const Verbosity& verbosity) : verbosity_(verbosity) {}
   void Display(const ErrorRecord& r, bool) override {
+    const bool error = r.errorClass == 3 || r.number == QFCFaultboxApp::kInternalFault;
+    const bool shown =
+        error || (r.errorClass == 2 && verbosity_ != Verbosity::kQuiet) || verbosity_ == Verbosity::kVerbose;
+    if (shown) {
+      Print(r);
+    } else if (r.errorClass == 0 && r.number != kSeparator && held_.size() < kHeld) {
+      held_.push_back(r);
+    }
+  }
+  // Some notes carry the detail of a failure (a failure class file's read
+  // error, a pin file's wrong name): a command that failed shows them after all.
+  void ShowHeldNotes() {
+    for (const ErrorRecord& r : held_) Print(r);
+    held_.clear();
+  }
+
+ private:
+  static constexpr int kSeparator = 154;
+  static constexpr std::size_t kHeld = 100;
+  static void Print(const ErrorRecord& r) {
     std::fprintf(stderr, "%s %d: %s\n", ClassWord(r.errorClass, r.number), r.number, r.Text().c_str());
     std::fflush(stderr);
   }
+  const Verbosity& verbosity_;
+  std::vector<ErrorRecord> held_;
 };
 
 class JsonSink : public MessageSink {
@@ -77,13 +105,21 @@ int main(int argc, char** argv) {
       ->check(CLI::IsMember({"text", "json"}))
       ->capture_default_str();
   app.add_option("--config", configFile, "Settings file to use instead of the default one");
+  bool verbose = false;
+  bool quiet = false;
+  auto* verboseFlag =
+      app.add_flag("--verbose,-v", verbose, "Print information and notes too, not only warnings and errors");
+  app.add_flag("--quiet,-q", quiet, "Print errors only")->excludes(verboseFlag);
 
   for (Registrar reg : kRegistrars) reg(app, ctx);
 
   // Settings and sinks must be in place before a command's callback runs.
-  TextSink textSink;
+  Verbosity verbosity = Verbosity::kNormal;
+  // JSON lines go to programs, which filter for themselves: they get every message.
+  TextSink textSink(verbosity);
   JsonSink jsonSink;
   app.parse_complete_callback([&] {
+    verbosity = quiet ? Verbosity::kQuiet : verbose ? Verbosity::kVerbose : Verbosity::kNormal;
     if (!configFile.empty()) Settings::SetPathOverride(configFile);
     ctx.json = messages == "json";
     TheApp().StartReporting();
@@ -101,5 +137,6 @@ int main(int argc, char** argv) {
     TheApp().ErrorAdapter().DisplayAllErrors(0, false);
     TheApp().StopReporting();
   }
+  if (!Succeeded(ctx.result) && verbosity == Verbosity::kNormal) textSink.ShowHeldNotes();
   return Succeeded(ctx.result) ? 0 : 1;
 }

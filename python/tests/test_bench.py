@@ -112,7 +112,15 @@ def test_reset_of_an_activated_pattern_or_pin_is_refused(kr60_bench):
         assert error.description
         assert pins[0].PinConfig == config and pins[0].AdjustedFailureClassID == (1, 0)
         assert faultbox.sim_relays(system) == [A12_ON]
-    expect_failure(faultbox.E_FAULTBOX, system.Close)
+    # The failures say why (messages 85, 97 and 169).
+    error = expect_failure(faultbox.E_FAULTBOX, system.Close)
+    assert "has an activated pattern" in error.description
+    other = system.FailurePatterns.Add("Other")
+    other.Pins.Add("A13", "ECM").SetFailureClass(1)
+    error = expect_failure(faultbox.E_FAULTBOX, other.Activate)
+    assert "Pattern Loads of this system is activated" in error.description
+    error = expect_failure(faultbox.E_FAULTBOX, system.SetInterfaceParameter, faultbox.fdtCAN_IF_LINKBOX_USB, 1, 1)
+    assert "cannot be changed while the system is connected" in error.description
     expect_failure(faultbox.E_FAULTBOX_DISCONNECT, system.Disconnect)
     pins[0].Deactivate()
     system.ResetHardware()

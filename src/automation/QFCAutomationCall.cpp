@@ -1,8 +1,10 @@
 // The automation call frame and the per-thread error information.
 #include "automation/QFCAutomationCall.h"
 
+#include <algorithm>
 #include <atomic>
 #include <optional>
+#include <vector>
 
 #include "patterns/QFCAbstractFailurePattern.h"
 
@@ -48,6 +50,31 @@ constexpr CodeText kCodeTexts[] = {
     {E_FAULTBOX_FAILURECLASS_NOT_CONFIGURATED, 6767},
 };
 
+bool HasTextOfItsOwn(HRESULT code) {
+  if (code == E_FAULTBOX) return false;
+  for (const CodeText& entry : kCodeTexts)
+    if (entry.code == code) return true;
+  return false;
+}
+
+std::string ReasonsOf(const std::vector<ErrorRecord>& records) {
+  for (const auto& wanted : {+[](const ErrorRecord& r) { return r.errorClass == 3; },
+                             +[](const ErrorRecord& r) { return r.errorClass == 2; },
+                             +[](const ErrorRecord& r) { return r.errorClass < 2; }}) {
+    std::vector<std::string> texts;
+    for (const ErrorRecord& record : records) {
+      if (!wanted(record)) continue;
+      std::string text = record.Text();
+      if (std::find(texts.begin(), texts.end(), text) == texts.end()) texts.push_back(std::move(text));
+    }
+    if (texts.empty()) continue;
+    std::string out;
+    for (const std::string& text : texts) out += (out.empty() ? "" : " ") + text;
+    return out;
+  }
+  return {};
+}
+
 }  // namespace
 
 QFCAutomationCall::QFCAutomationCall() {
@@ -72,8 +99,19 @@ HRESULT QFCAutomationCall::Return(HRESULT code) {
   if (t_errorInfo && t_errorInfo->code == code) return code;
   t_errorInfo.reset();
   std::string description = ErrorDescriptionOfCode(code);
+  // "An unspecified error occurred" tells a script nothing: the messages the
+  // model reported on the way say what went wrong.
+  if (!HasTextOfItsOwn(code)) {
+    if (std::string reasons = ReasonsOf(reported_.Records()); !reasons.empty())
+      description = std::move(reasons);
+  }
   if (!description.empty()) t_errorInfo = QFTErrorInfo{code, std::move(description)};
   return code;
+}
+
+std::string ReasonsReportedInCall() {
+  const ThreadReportCollector* collector = ThreadReportCollector::Innermost();
+  return collector ? ReasonsOf(collector->Records()) : std::string();
 }
 
 HRESULT QFCAutomationCall::Detached(const std::string& keptText) {

@@ -6,6 +6,7 @@
 #include <string>
 
 #include "host/ResultCodes.h"
+#include "platform/ThreadReportCollector.h"
 
 namespace faultbox {
 
@@ -28,11 +29,21 @@ class QFCAutomationCall {
   static bool InProgress();
 
   // The member's result: a failure without error information of its own gets
-  // the description of its code (codes without one get none).
+  // the description of its code, or, when the code says no more than that
+  // the member failed, the texts of the errors (else warnings) reported
+  // during the call; codes without either get none.
   HRESULT Return(HRESULT code);
   // The wrapper's model object is gone: E_FAULTBOX with the kept text.
   HRESULT Detached(const std::string& keptText);
+
+ private:
+  ThreadReportCollector reported_;
 };
+
+// The texts of the errors reported so far during the member that runs on this
+// thread (else its warnings, else its internal faults), each once, joined by
+// blanks; "" when nothing was reported.
+std::string ReasonsReportedInCall();
 
 // Sets the thread's error information and answers `code`, for a member that
 // knows more than its code says.

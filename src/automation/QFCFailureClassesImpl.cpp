@@ -10,6 +10,8 @@ namespace faultbox {
 
 namespace {
 
+constexpr int kTextNoClass = 6728;
+
 QFCAbstractFailureClasses* ClassesOf(const QFCSystem* system) {
   return system ? system->GetFailureClasses() : nullptr;
 }
@@ -36,7 +38,8 @@ HRESULT QFCFailureClassesImpl::Item(const Variant& index,
       return -1;
     };
     int position = -1;
-    if (HRESULT hr = ResolveIndex(index, classes->GetCount(), byName, 0, position); Failed(hr)) return hr;
+    if (HRESULT hr = ResolveIndex(index, classes->GetCount(), byName, kTextNoClass, position); Failed(hr))
+      return hr;
     failureClass = QFCSystemImpl::Of(system)->ClassWrapper(system, classes->GetAt(position));
     return failureClass ? FAULTBOX_OK : E_FAULTBOX_NULL_POINTER;
   });

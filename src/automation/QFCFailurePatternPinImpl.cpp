@@ -116,6 +116,14 @@ HRESULT QFCBaseFailurePatternPinImpl::get_AdjustedFailureClass(
   });
 }
 
+HRESULT QFCBaseFailurePatternPinImpl::get_RefusalReason(std::string& reason) {
+  return Call([&](QFCAbstractFailurePatternPin& pin) {
+    if (!Usable(pin)) return E_FAULTBOX_NULL_POINTER;
+    reason = pin.GetRefusalReason();
+    return FAULTBOX_OK;
+  });
+}
+
 HRESULT QFCBaseFailurePatternPinImpl::Activate() {
   return Switch(true);
 }

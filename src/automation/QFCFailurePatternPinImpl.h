@@ -44,6 +44,9 @@ class QFCBaseFailurePatternPinImpl : public QFCOwnerProvider<QFCAbstractFailureP
   HRESULT get_AdjustedFailureClassID(std::int32_t& id, std::int32_t& relayVector);
   // E_FAULTBOX_FAILURE_PATTERN_ARE_ACTIVATED, changing nothing, for an activated pin.
   HRESULT Reset();
+  // Extension: why the safety interlock left the pin without a failure class
+  // at its last check; "" while the pin holds one.
+  HRESULT get_RefusalReason(std::string& reason);
 
  protected:
   explicit QFCBaseFailurePatternPinImpl(QFCAbstractFailurePatternPin* owner) : QFCOwnerProvider(owner) {}

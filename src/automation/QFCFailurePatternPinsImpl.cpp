@@ -2,6 +2,7 @@
 #include "automation/QFCFailurePatternPinsImpl.h"
 
 #include "automation/AutomationLookup.h"
+#include "automation/QFCAutomationCall.h"
 #include "automation/QFCFailurePatternPinImpl.h"
 #include "patterns/QFCAbstractFailurePattern.h"
 #include "patterns/QFCAbstractFailurePatternPin.h"
@@ -11,6 +12,9 @@
 namespace faultbox {
 
 namespace {
+
+constexpr int kTextNoPin = 6718;
+constexpr int kTextNoSystemPin = 6729;
 
 HRESULT Resolve(const QFCFailurePatternPins& pins, const Variant& index, const std::string& ecuName,
                 QFCAbstractFailurePatternPin*& pin) {
@@ -25,7 +29,8 @@ HRESULT Resolve(const QFCFailurePatternPins& pins, const Variant& index, const s
     return -1;
   };
   int position = -1;
-  if (HRESULT hr = ResolveIndex(index, pins.GetCount(), byName, 0, position); Failed(hr)) return hr;
+  if (HRESULT hr = ResolveIndex(index, pins.GetCount(), byName, kTextNoPin, position, ecuName); Failed(hr))
+    return hr;
   pin = pins.GetAt(position);
   return pin ? FAULTBOX_OK : E_FAULTBOX_NULL_POINTER;
 }
@@ -81,7 +86,8 @@ HRESULT QFCFailurePatternPinsImpl::Add(const std::string& pinName, const std::st
     failurePatternPin.reset();
     QFCSystem* system = pattern.GetOwnerSystem();
     QFCAbstractPin* pin = system ? system->FindPin(ecuName, pinName) : nullptr;
-    if (pin == nullptr) return E_FAULTBOX_INVALID_PARAMETER;
+    if (pin == nullptr)
+      return RaiseError(E_FAULTBOX_INVALID_PARAMETER, AutomationText(kTextNoSystemPin, {pinName, ecuName}));
     if (!pattern.AddPins({pin})) return E_FAULTBOX;
     return WrapperOf(pattern.GetPins()->FindPin(pinName, ecuName), failurePatternPin);
   });

@@ -2,6 +2,7 @@
 #include "automation/QFCFailurePatternsImpl.h"
 
 #include "automation/AutomationLookup.h"
+#include "automation/QFCAutomationCall.h"
 #include "automation/QFCFailurePatternImpl.h"
 #include "patterns/QFCAbstractFailurePattern.h"
 #include "patterns/QFCFailurePatterns.h"
@@ -11,6 +12,7 @@ namespace faultbox {
 
 namespace {
 
+constexpr int kTextPatternNameUsed = 6716;
 constexpr int kTextNoPattern = 6717;
 
 HRESULT Resolve(const QFCFailurePatterns& patterns, const Variant& index,
@@ -77,7 +79,12 @@ HRESULT QFCFailurePatternsImpl::Add(const std::string& name,
   return Call([&](QFCSystem& system) {
     failurePattern.reset();
     QFCAbstractFailurePattern* created = nullptr;
-    if (HRESULT hr = system.CreatePattern(name, created); Failed(hr)) return hr;
+    if (HRESULT hr = system.CreatePattern(name, created); Failed(hr)) {
+      // The code's own text speaks of systems; this name belongs to a pattern.
+      if (hr == E_FAULTBOX_NAME_NOT_UNIQUE)
+        return RaiseError(hr, AutomationText(kTextPatternNameUsed, {name}));
+      return hr;
+    }
     if (created == nullptr) return E_FAULTBOX;
     failurePattern = QFCBaseFailurePatternImpl::Of(*created);
     return failurePattern ? FAULTBOX_OK : E_FAULTBOX_BOARD_TYPE_IS_NOT_SUPORTED;

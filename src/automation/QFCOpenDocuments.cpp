@@ -16,6 +16,7 @@ namespace faultbox {
 
 namespace {
 constexpr int kMsgFileMissing = 46;
+constexpr int kMsgOpenWithOtherPinFile = 66;
 constexpr int kTextCannotOpen = 6715;
 }  // namespace
 
@@ -47,10 +48,19 @@ HRESULT QFCOpenDocuments::Open(const std::string& fileName, const std::string& p
     // of the document cannot exist.
     if (QFCSystem* open = document->GetAlreadyOpenSystem();
         open != nullptr && FindDocument(open) != nullptr) {
+      // The open system stays on its pin file: going on with it would leave
+      // the script on a wiring it did not ask for.
+      if (!pinFile.empty() &&
+          !QFCFileHelper::SameFile(open->GetPinFilePath(), QFCFileHelper::GetAbsolutePath(pinFile, {}))) {
+        TheApp().ReportError(kMsgOpenWithOtherPinFile, open->GetName(), open->GetPinFilePath());
+        return E_FAULTBOX_INVALID_PARAMETER;
+      }
       system = open;
       return FAULTBOX_OK;
     }
-    return RaiseError(E_FAULTBOX_FILE_IS_NOT_OPENED, AutomationText(kTextCannotOpen, {fileName}));
+    std::string description = AutomationText(kTextCannotOpen, {fileName});
+    if (std::string reasons = ReasonsReportedInCall(); !reasons.empty()) description += " " + reasons;
+    return RaiseError(E_FAULTBOX_FILE_IS_NOT_OPENED, std::move(description));
   }
   system = document->GetSystem();
   documents_.push_back(std::move(document));

@@ -2,6 +2,8 @@
 // changes, and the failure class the interlock gives it.
 #include "patterns/QFCAbstractFailurePatternPin.h"
 
+#include <cstdio>
+
 #include "config/QFCAbstractFailureClass.h"
 #include "config/QFCAbstractPin.h"
 #include "config/QFCECU.h"
@@ -18,6 +20,10 @@ constexpr int kMsgReadOnly = 118;
 constexpr int kMsgClassNotFound = 126;
 
 constexpr int kResNoFailureClass = 6764;
+constexpr int kResNoClass = 6777;
+constexpr int kResEcuDisabled = 6784;
+constexpr int kResNotInPinFile = 6785;
+constexpr int kResModuleSilent = 6786;
 constexpr int kResNotConfigured = 6787;
 constexpr int kResClassTextFormat = 6788;
 
@@ -117,6 +123,22 @@ bool QFCAbstractFailurePatternPin::GetDefinedFailureClasses(
     if (QFCAbstractFailureClass* fc = all->FindById(id)) classes.push_back(fc);
   }
   return true;
+}
+
+std::string QFCAbstractFailurePatternPin::GetNotReadyReason() const {
+  if (IsReadyForActivation()) return {};
+  if (pin_ == nullptr || !IsFromPinFile()) return QFCAbstractFailurePattern::ResourceText(kResNotInPinFile);
+  if (!canBeActivated_) {
+    if (!refusalReason_.empty()) return refusalReason_;
+    return QFCAbstractFailurePattern::ResourceText(kResNoClass);
+  }
+  const QFCECU* ecu = pin_->GetEcu();
+  if (ecu == nullptr || !ecu->IsEnabled())
+    return QFCAbstractFailurePattern::ResourceText(kResEcuDisabled, {GetEcuName()});
+  std::uint32_t address = 0;
+  char text[16] = "?";
+  if (GetModuleAddress(address)) std::snprintf(text, sizeof text, "0x%03X", address);
+  return QFCAbstractFailurePattern::ResourceText(kResModuleSilent, {text});
 }
 
 bool QFCAbstractFailurePatternPin::IsReadyForActivation() const {

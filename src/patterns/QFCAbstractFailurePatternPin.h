@@ -60,6 +60,9 @@ class QFCAbstractFailurePatternPin : public QFCAbstractObjectData {
   // Can be activated, its ECU is there and enabled, it is from the pin file
   // and its module answered the last reset.
   bool IsReadyForActivation() const;
+  // Why an activation would leave the pin out now, in words for the user;
+  // "" when it is ready.
+  std::string GetNotReadyReason() const;
 
   // ---- flags ----
   bool IsSelected() const { return selected_; }
@@ -86,6 +89,10 @@ class QFCAbstractFailurePatternPin : public QFCAbstractObjectData {
   std::int32_t GetRelayVectorIndex() const { return relayVectorIndex_; }
   const std::string& GetFailureClassText() const { return failureClassText_; }
   void SetFailureClassText(std::string text) { failureClassText_ = std::move(text); }
+  // Why the interlock left the pin without a failure class at its last
+  // check, in words for the user; "" while the pin holds one.
+  const std::string& GetRefusalReason() const { return refusalReason_; }
+  void SetRefusalReason(std::string reason) { refusalReason_ = std::move(reason); }
   // Gives back the use of the class the pin holds and forgets the class:
   // for a pin that leaves its pattern.
   void ReleaseFailureClass();
@@ -100,6 +107,7 @@ class QFCAbstractFailurePatternPin : public QFCAbstractObjectData {
   std::int32_t failureClassId_ = -1;
   std::int32_t relayVectorIndex_ = -1;
   std::string failureClassText_;
+  std::string refusalReason_;
   bool selected_ = false;
   bool activated_ = false;
   bool canBeActivated_ = false;

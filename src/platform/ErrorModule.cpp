@@ -4,10 +4,35 @@
 #include <algorithm>
 
 #include "platform/MessageTable.h"
+#include "platform/ThreadReportCollector.h"
 
 namespace faultbox {
 
 std::string ErrorRecord::Text() const { return FormatMessage(number, first, second); }
+
+namespace {
+thread_local ThreadReportCollector* t_innermost = nullptr;
+constexpr int kInternalFault = 35;
+}  // namespace
+
+ThreadReportCollector::ThreadReportCollector() : outer_(t_innermost) {
+  t_innermost = this;
+}
+
+ThreadReportCollector::~ThreadReportCollector() {
+  t_innermost = outer_;
+}
+
+const ThreadReportCollector* ThreadReportCollector::Innermost() {
+  return t_innermost;
+}
+
+void ThreadReportCollector::Note(const ErrorRecord& record) {
+  // Progress and plain notes never explain a failure.
+  if (record.errorClass < 2 && record.number != kInternalFault) return;
+  for (ThreadReportCollector* c = t_innermost; c != nullptr; c = c->outer_)
+    if (c->records_.size() < kKept) c->records_.push_back(record);
+}
 
 bool ErrorModule::Create(int mainModule, int, int, void*, const std::string& componentName) {
   std::lock_guard lock(mutex_);
@@ -28,6 +53,7 @@ int ErrorModule::SetError(int errorClass, int dialogKind, int number, const std:
   ErrorRecord record{nextHandle_, errorClass, dialogKind, number, first, second};
   // Handles travel as 16-bit values in places; keep them small and never 0.
   nextHandle_ = nextHandle_ >= 0x7FFF ? 1 : nextHandle_ + 1;
+  ThreadReportCollector::Note(record);
   if (stack_.size() >= kMaxRecords) stack_.pop_front();
   stack_.push_back(std::move(record));
   return stack_.back().handle;

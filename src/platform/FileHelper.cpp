@@ -4,13 +4,17 @@
 
 #include "platform/Text.h"
 
+#include <dirent.h>
 #include <fcntl.h>
 #include <sys/stat.h>
 #include <sys/statvfs.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <climits>
+#include <filesystem>
 #include <string_view>
+#include <system_error>
 #include <vector>
 
 namespace faultbox {
@@ -132,6 +136,49 @@ bool QFCFileHelper::IsWriteProtected(const std::string& path) {
   if (::faccessat(AT_FDCWD, native.c_str(), W_OK, AT_EACCESS) != 0) return true;
   struct statvfs fs {};
   return ::statvfs(native.c_str(), &fs) == 0 && (fs.f_flag & ST_RDONLY) != 0;
+}
+
+bool QFCFileHelper::SameFile(const std::string& a, const std::string& b) {
+  const std::string nativeA = ToNative(a);
+  const std::string nativeB = ToNative(b);
+  if (nativeA == nativeB) return true;
+  struct stat sa {};
+  struct stat sb {};
+  if (::stat(nativeA.c_str(), &sa) == 0 && ::stat(nativeB.c_str(), &sb) == 0)
+    return sa.st_dev == sb.st_dev && sa.st_ino == sb.st_ino;
+  std::error_code errorA;
+  std::error_code errorB;
+  const auto canonicalA = std::filesystem::weakly_canonical(GetAbsolutePath(nativeA, {}), errorA);
+  const auto canonicalB = std::filesystem::weakly_canonical(GetAbsolutePath(nativeB, {}), errorB);
+  if (errorA || errorB) return GetAbsolutePath(nativeA, {}) == GetAbsolutePath(nativeB, {});
+  return canonicalA == canonicalB;
+}
+
+std::string QFCFileHelper::FindIgnoringCase(const std::string& path) {
+  const std::string native = ToNative(path);
+  if (native.empty() || native.front() != '/') return {};
+  if (Exists(native)) return native;
+  const SplitPath split = Split(native);
+  std::string found = "/";
+  for (std::size_t i = 0; i < split.segments.size(); ++i) {
+    const std::string& wanted = split.segments[i];
+    std::string exact = found + wanted;
+    struct stat st {};
+    if (::lstat(exact.c_str(), &st) != 0) {
+      DIR* dir = ::opendir(found.c_str());
+      if (dir == nullptr) return {};
+      std::vector<std::string> matches;
+      while (const dirent* entry = ::readdir(dir)) {
+        const std::string name = entry->d_name;
+        if (name != "." && name != ".." && SameSegment(name, wanted, true)) matches.push_back(name);
+      }
+      ::closedir(dir);
+      if (matches.empty()) return {};
+      exact = found + *std::min_element(matches.begin(), matches.end());
+    }
+    found = i + 1 < split.segments.size() ? exact + "/" : exact;
+  }
+  return Exists(found) ? found : std::string();
 }
 
 std::string QFCFileHelper::FileName(const std::string& path) {

@@ -25,6 +25,17 @@ class QFCFileHelper {
   // write-protected: saving creates it.
   static bool IsWriteProtected(const std::string& path);
 
+  // True when both paths name one file: the same device and inode when both
+  // exist, else the same path once made absolute with the symbolic links of
+  // its existing part resolved. Case counts, as it does for Linux file names.
+  static bool SameFile(const std::string& a, const std::string& b);
+  // For paths written on Windows, whose case may differ from the files on
+  // disk: `path` when it exists, else the existing path whose every folder
+  // and file name equals that of `path` without regard to case (at each
+  // level an exact match first, else the first such name in sorted order);
+  // "" when there is none or `path` is not absolute.
+  static std::string FindIgnoringCase(const std::string& path);
+
   // The file name without its folder ("a\b\c.csv" and "a/b/c.csv" give "c.csv").
   static std::string FileName(const std::string& path);
   // The folder of a path, with a trailing '/', or "" when there is none.

@@ -346,23 +346,31 @@ void QFCFaultboxDoc::ReportSaveLoadException(const std::string& path, const std:
 std::string QFCFaultboxDoc::FindPinFile(const std::string& pinFile) {
   std::string path = pinFile;
   if (!pinFileReplacement_.empty()) {
-    TheApp().ReportWarning(kMsgOtherPinFile, pinFileReplacement_, path);
-    path = Absolute(pinFileReplacement_);
+    const std::string replacement = Absolute(pinFileReplacement_);
+    TheApp().ReportWarning(kMsgOtherPinFile, replacement, path);
+    path = replacement;
     pinFileReplacement_.clear();
     changedOnLoad_ = true;
   }
   if (IsUsable(path)) return path;
   TheApp().ReportError(kMsgFileUnusable, path);
 
+  auto use = [&](const std::string& found) {
+    TheApp().ReportWarning(kMsgOtherPinFile, found, path);
+    changedOnLoad_ = true;
+    return found;
+  };
+  // A document written on Windows may name the pin file in another case than
+  // the file on disk has.
+  if (const std::string found = QFCFileHelper::FindIgnoringCase(path); !found.empty() && IsUsable(found))
+    return use(found);
   // A bench folder copied or moved as a whole keeps the pin file beside the document.
   const std::string folder = QFCFileHelper::Folder(archivePath_);
   const std::string candidate = folder.empty() ? std::string() : folder + QFCFileHelper::FileName(path);
   if (!candidate.empty() && candidate != QFCFileHelper::ToNative(path)) {
-    if (IsUsable(candidate)) {
-      TheApp().ReportWarning(kMsgOtherPinFile, candidate, path);
-      changedOnLoad_ = true;
-      return candidate;
-    }
+    if (const std::string found = QFCFileHelper::FindIgnoringCase(candidate);
+        !found.empty() && IsUsable(found))
+      return use(found);
     // Nobody can be asked for the file: name every place that was tried.
     TheApp().ReportError(kMsgFileUnusable, candidate);
   }

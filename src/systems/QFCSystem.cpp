@@ -2,6 +2,7 @@
 // document part.
 #include "systems/QFCSystem.h"
 
+#include <algorithm>
 #include <set>
 
 #include "comm/QFCCANTransferInterface.h"
@@ -350,9 +351,14 @@ void QFCSystem::UpdateViews(int hint) {
 void QFCSystem::Serialize(Archive& ar) {
   QFCSystemProperty::Serialize(ar);
   if (ar.IsStoring()) {
+    // Each name once: loading disables every ECU of a stored name, so a name
+    // written once per ECU would change the file on every load and save when
+    // only some ECUs of that name were disabled.
     std::vector<const std::string*> disabled;
     for (const QFCECU* ecu : ecus_)
-      if (!ecu->IsEnabled()) disabled.push_back(&ecu->GetName());
+      if (!ecu->IsEnabled() && std::none_of(disabled.begin(), disabled.end(),
+                                            [&](const std::string* name) { return *name == ecu->GetName(); }))
+        disabled.push_back(&ecu->GetName());
     ar.WriteU32(static_cast<std::uint32_t>(disabled.size()));
     for (const std::string* name : disabled) ar.WriteString(*name);
     patterns_->Serialize(ar);

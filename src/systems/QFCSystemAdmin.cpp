@@ -5,6 +5,7 @@
 
 #include "config/QFCFSHelper.h"
 #include "host/QFCFaultboxApp.h"
+#include "platform/FileHelper.h"
 #include "platform/MessageTable.h"
 #include "systems/QFCSystem.h"
 
@@ -29,6 +30,17 @@ std::string FormatDefaultName(int number) {
       return text.replace(at, 2, std::to_string(number));
   }
   return text + " " + std::to_string(number);
+}
+
+// A saved system is named after its document's path, and two documents are
+// one when they are one file: Linux file names regard case, so "Bench.fsa"
+// and "bench.fsa" may be two documents, and a link to a document is that
+// document. Other names (the default names of unsaved systems) compare
+// without regard to case.
+bool SameName(std::string_view a, std::string_view b) {
+  if (!a.empty() && !b.empty() && a.front() == '/' && b.front() == '/')
+    return QFCFileHelper::SameFile(std::string(a), std::string(b));
+  return QFCFSHelper::EqualNoCase(a, b);
 }
 
 }  // namespace
@@ -61,13 +73,13 @@ HRESULT QFCSystemAdmin::Open(const std::string& pinFile, std::int32_t ecuVersion
 
 QFCSystem* QFCSystemAdmin::FindByName(std::string_view name) const {
   for (const auto& system : systems_)
-    if (QFCFSHelper::EqualNoCase(system->GetName(), name)) return system.get();
+    if (SameName(system->GetName(), name)) return system.get();
   return nullptr;
 }
 
 bool QFCSystemAdmin::IsNameUsed(std::string_view name, const QFCSystem* ignore) const {
   for (const auto& system : systems_)
-    if (system.get() != ignore && QFCFSHelper::EqualNoCase(system->GetName(), name)) return true;
+    if (system.get() != ignore && SameName(system->GetName(), name)) return true;
   return false;
 }
 
@@ -78,7 +90,7 @@ QFCSystem* QFCSystemAdmin::GetAt(int index) const {
 
 void QFCSystemAdmin::Remove(const std::string& name) {
   for (auto it = systems_.begin(); it != systems_.end(); ++it) {
-    if (!QFCFSHelper::EqualNoCase((*it)->GetName(), name)) continue;
+    if (!SameName((*it)->GetName(), name)) continue;
     TheApp().ReportInfo(kMsgSystemClosed, (*it)->GetName());
     // Destroying the system disconnects it without reports.
     systems_.erase(it);

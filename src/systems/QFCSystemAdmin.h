@@ -29,7 +29,9 @@ class QFCSystemAdmin {
   // The first default name ("System 1", "System 2", ...) that no system bears.
   std::string GetDefaultName() const;
 
-  // The first system whose name equals `name` without regard to case, or nullptr.
+  // The first system whose name equals `name`, or nullptr. Document paths (the
+  // names of saved systems) are equal when they name the same file; other
+  // names compare without regard to case.
   QFCSystem* FindByName(std::string_view name) const;
   // True when a system other than `ignore` bears the name.
   bool IsNameUsed(std::string_view name, const QFCSystem* ignore = nullptr) const;

@@ -54,5 +54,41 @@ TEST(CliTest, MessagesInJsonFormAreOneObjectPerLine) {
   EXPECT_EQ(count, 2);
 }
 
+// The terminal shows errors and warnings; --verbose adds information and
+// notes, --quiet leaves errors only; JSON lines carry every message.
+TEST(CliTest, VerbosityChoosesTheClassesPrinted) {
+  test::TempDir dir;
+  std::string pins = test::ReadText(FAULTBOX_SOURCE_DIR "/data/kr40_bench.csv");
+  pins.insert(pins.find("/FormatEnd"), "Author;\r\n");  // a key without a value: warning 38
+  const std::string file = dir.Write("bench.csv", pins);
+  const struct {
+    std::vector<std::string> options;
+    bool warning, information, note;
+  } cases[] = {
+      {{}, true, false, false},
+      {{"--verbose"}, true, true, true},
+      {{"-q"}, false, false, false},
+      {{"--messages=json", "--quiet"}, true, true, true},
+  };
+  for (const auto& c : cases) {
+    std::vector<std::string> args = c.options;
+    args.insert(args.end(), {"pinfile", "check", file});
+    const test::ProcessResult r = RunFaultbox(args);
+    SCOPED_TRACE(r.err);
+    EXPECT_EQ(r.exitCode, 0);
+    const bool json = r.err.rfind("{", 0) == 0;
+    EXPECT_EQ(r.err.find(json ? "\"number\":38" : "warning 38") != std::string::npos, c.warning);
+    EXPECT_EQ(r.err.find(json ? "\"number\":152" : "info 152") != std::string::npos, c.information);
+    EXPECT_EQ(r.err.find(json ? "\"number\":154" : "note 154") != std::string::npos, c.note);
+  }
+  // A command that failed shows the notes that carry the detail, too.
+  const test::ProcessResult failed = RunFaultbox({"pinfile", "check", dir.Write("bench.txt", pins)});
+  EXPECT_EQ(failed.exitCode, 1);
+  EXPECT_NE(failed.err.find("note 72: "), std::string::npos) << failed.err;
+  // Errors are printed even with --quiet.
+  EXPECT_EQ(RunFaultbox({"--quiet", "messages", "7"}).err.rfind("error 902: ", 0), 0u);
+  EXPECT_EQ(RunFaultbox({"--quiet", "--verbose", "messages", "47"}).exitCode, 2);
+}
+
 }  // namespace
 }  // namespace faultbox

@@ -59,8 +59,8 @@ class DocCliTest : public ::testing::Test {
 TEST_F(DocCliTest, BuildsAKR40DocumentStepByStep) {
   const std::string pins = CopySample("kr40_bench.csv");
   const std::string doc = dir_.File("body bench.fss");
-  const ProcessResult created =
-      Run({"doc", "new", "--pin-file", pins, "--author", "Tess", "--description", "bench 2", doc});
+  const ProcessResult created = Run(
+      {"--verbose", "doc", "new", "--pin-file", pins, "--author", "Tess", "--description", "bench 2", doc});
   ASSERT_EQ(created.exitCode, 0) << created.err;
   EXPECT_NE(created.out.find("created " + doc), std::string::npos) << created.out;
   EXPECT_NE(created.err.find("info 115"), std::string::npos) << created.err;
@@ -109,6 +109,14 @@ TEST_F(DocCliTest, BuildsAKR40DocumentStepByStep) {
       << text.out;
   EXPECT_NE(text.out.find("SEAT_CTRL (disabled)"), std::string::npos) << text.out;
 
+  // A setting that leaves a pin without a class says why, for that pin.
+  const ProcessResult refused = Run({"pattern", "config", doc, "Door test", "--pin", "DCU_FL", "X1.3", "2", "1"});
+  EXPECT_NE(refused.out.find("DCU_FL X1.3: PinConfig 21122, no failure class: No relay vector of the pin's "
+                             "failure classes allows the PinConfig entries that are switched on."),
+            std::string::npos)
+      << refused.out;
+  Run({"pattern", "config", doc, "Door test", "--pin", "DCU_FL", "X1.3", "2", "0"});
+
   Ok({"pattern", "remove-pins", doc, "Door test", "--pin", "DCU_FL", "X1.3"});
   Ok({"pattern", "reset", doc, "Door test"});
   Ok({"pattern", "rename", doc, "Door test", "Door"});
@@ -133,7 +141,7 @@ TEST_F(DocCliTest, RefusalsLeaveTheDocumentAsItWas) {
     std::vector<std::string> args;
     const char* message;
   } cases[] = {
-      {{"pattern", "create", doc, "A"}, "87"},                                      // name in use
+      {{"pattern", "create", doc, "A"}, "error 87"},                                // name in use
       {{"pattern", "delete", doc, "B"}, "error 920"},                               // no such pattern
       {{"pattern", "add-pins", doc, "A", "--pin", "BCM", "X9"}, "error 921"},       // no such pin
       {{"pattern", "add-pins", doc, "A", "--pin", "bcm", "X1.1"}, "error 921"},     // names regard case
@@ -168,7 +176,10 @@ TEST_F(DocCliTest, RefusalsLeaveTheDocumentAsItWas) {
 
 TEST_F(DocCliTest, KR60DocumentWithAdditionalPinFile) {
   const std::string pins = CopySample("kr60_bench.csv");
-  CopySample("kr60_additional.csv");
+  // The additional pin file lists the ECU "ECM" of the main one again.
+  std::string additional = ReadText(CopySample("kr60_additional.csv"));
+  additional.insert(additional.find("/SignallistEnd"), "D01;ECM;1;1;0_2_2;4;EXTRA;-;-\r\n");
+  dir_.Write("kr60_additional.csv", additional);
   const std::string doc = dir_.File("chassis.fsa");
   ASSERT_EQ(Run({"doc", "new", "--pin-file", pins, doc}).exitCode, 0);
   Ok({"pattern", "create", doc, "Crank"});
@@ -179,6 +190,57 @@ TEST_F(DocCliTest, KR60DocumentWithAdditionalPinFile) {
   ASSERT_EQ(j["patterns"].size(), 1u);
   EXPECT_EQ(j["patterns"][0]["pins"].size(), 2u);
   EXPECT_EQ(j["patterns"][0]["pins"][1]["ecu"], "AIRBAG");
+
+  // Disabling "ECM" disables it in both pin files, and the document stays
+  // the same through every later load and save.
+  const ProcessResult disabled = Run({"ecu", "disable", doc, "ECM"});
+  EXPECT_NE(disabled.out.find("ECU ECM disabled (in 2 pin files)"), std::string::npos) << disabled.out;
+  const std::string saved = ReadText(doc);
+  int ecms = 0;
+  const nlohmann::json shown = Show(doc);
+  for (const auto& ecu : shown["ecus"]) {
+    if (ecu["name"] != "ECM") continue;
+    EXPECT_EQ(ecu["enabled"], false);
+    ++ecms;
+  }
+  EXPECT_EQ(ecms, 2);
+  Ok({"pattern", "reset", doc, "Crank"});
+  EXPECT_EQ(ReadText(doc), saved);
+}
+
+// A document written on Windows may name its pin file in another case than
+// the file on disk has: the stored folder and the document's folder are
+// searched without regard to case, and message 64 names the file used.
+TEST_F(DocCliTest, PinFileNamedInAnotherCase) {
+  const struct {
+    const char* name;
+    const char* movedTo;  // where the pin file is found afterwards
+  } cases[] = {
+      {"FileName", "Pins/kr40_bench.CSV"},
+      {"FolderAndFileName", "pins/KR40_BENCH.csv"},
+      {"BesideTheDocument", "Kr40_Bench.csv"},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.name);
+    std::filesystem::remove_all(dir_.File("Pins"));
+    std::filesystem::remove_all(dir_.File("pins"));
+    std::filesystem::create_directory(dir_.File("Pins"));
+    std::filesystem::copy_file(FAULTBOX_SOURCE_DIR "/data/kr40_bench.csv", dir_.File("Pins/kr40_bench.csv"));
+    const std::string doc = dir_.File(std::string(c.name) + ".fss");
+    ASSERT_EQ(Run({"doc", "new", "--pin-file", dir_.File("Pins/kr40_bench.csv"), doc}).exitCode, 0);
+    const std::string used = dir_.File(c.movedTo);
+    std::filesystem::create_directories(std::filesystem::path(used).parent_path());
+    std::filesystem::rename(dir_.File("Pins/kr40_bench.csv"), used);
+    if (std::string(c.movedTo).rfind("pins/", 0) == 0) std::filesystem::remove_all(dir_.File("Pins"));
+
+    const ProcessResult shown = Run({"doc", "show", doc});
+    EXPECT_EQ(shown.exitCode, 0) << shown.err;
+    EXPECT_NE(shown.err.find("warning 64: The pin file " + used + " is used instead of " +
+                             dir_.File("Pins/kr40_bench.csv")),
+              std::string::npos)
+        << shown.err;
+    std::filesystem::remove(used);
+  }
 }
 
 }  // namespace

@@ -7,6 +7,7 @@
 
 #include <filesystem>
 #include <regex>
+#include <set>
 #include <sstream>
 #include <string>
 #include <string_view>
@@ -107,6 +108,23 @@ class HardwareCli : public ::testing::Test {
     return doc;
   }
 
+  // Every answer in a KR60 trace (direction 01) comes after a request
+  // (direction 00) to its module or to every module of its type.
+  static void ExpectRequestsBeforeAnswers(const std::string& trace) {
+    std::istringstream lines(trace);
+    std::set<std::uint32_t> asked;
+    std::string line;
+    while (std::getline(lines, line)) {
+      const std::size_t at = line.find(' ', line.find(' ') + 1) + 1;
+      const std::uint32_t id = static_cast<std::uint32_t>(std::stoul(line.substr(at, 8), nullptr, 16));
+      const std::uint32_t module = id & 0xFFFF;
+      if (((id >> 16) & 3) == 0)
+        asked.insert(module);
+      else
+        EXPECT_TRUE(asked.count(module) != 0 || asked.count(module & 0xF000) != 0) << line << "\n" << trace;
+    }
+  }
+
   // Checks the trace's form and that it holds the case's lines.
   static void ExpectTrace(const BenchCase& c, const std::string& path) {
     std::istringstream lines(ReadText(path));
@@ -126,6 +144,7 @@ class HardwareCli : public ::testing::Test {
     if (std::string_view(c.name) == "KR60") {
       const std::string once = " 00401011#8204FEFFFFFF7FFF\n";
       EXPECT_EQ(all.find(once), all.rfind(once)) << once << "\n" << all;
+      ExpectRequestsBeforeAnswers(all);
     }
   }
 
@@ -309,9 +328,11 @@ TEST_F(HardwareCliRefusals, PinsThatAreNotReadyAreLeftOut) {
   } cases[] = {
       {"ECM",
        0,
-       "activated Test: TCU 7\nleft out (not ready, see the messages): ECM K12\n",
+       "activated Test: TCU 7\nleft out:\n  ECM K12: ECU ECM is disabled.\n",
        {"FIU 0x21: relay 1 (state 3) on"}},
-      {"TCU", 1, "Test was not activated: no pin is ready (see the messages): ECM K12, TCU 7\n", kAllOff},
+      {"TCU", 1,
+       "Test was not activated: no pin is ready\n  ECM K12: ECU ECM is disabled.\n  TCU 7: ECU TCU is disabled.\n",
+       kAllOff},
   };
   for (const auto& c : cases) {
     SCOPED_TRACE(c.disable);

@@ -15,7 +15,7 @@ namespace {
 // Every message number the component raises.
 const std::vector<int> kRaisedMessages = {
     34,  35,  37,  38,  39,  40,  41,  42,  43,  45,  46,  47,  48,  49,  50,  51,  54,  55,  57,  58,
-    59,  60,  61,  62,  63,  64,  65,  67,  69,  72,  73,  75,  76,  80,  81,  82,  83,  84,  85,  86,
+    59,  60,  61,  62,  63,  64,  65,  66,  67,  69,  72,  73,  75,  76,  80,  81,  82,  83,  84,  85,  86,
     87,  88,  89,  90,  91,  92,  93,  94,  97,  98,  99,  100, 101, 103, 105, 107, 108, 109, 110, 111,
     112, 113, 114, 115, 116, 117, 118, 119, 120, 125, 126, 127, 128, 129, 130, 131, 132, 133, 134, 135,
     136, 140, 142, 143, 144, 145, 146, 147, 148, 149, 150, 151, 152, 153, 154, 155, 156, 157, 158, 161,
@@ -27,12 +27,14 @@ const std::vector<int> kRaisedMessages = {
     930, 931, 932, 933, 934};
 
 // Every resource string the component loads by number.
-const std::vector<int> kUsedStrings = {6701, 6704, 6706, 6707, 6709, 6711, 6712, 6713, 6714, 6715, 6717, 6719,
-                                       6720, 6721, 6722, 6723, 6724, 6725, 6726, 6727, 6731, 6732, 6733, 6735,
-                                       6740, 6742, 6745, 6747, 6748, 6749, 6750, 6752, 6761, 6762, 6764, 6766,
-                                       6767, 6768, 6769, 6770, 6771, 6772, 6773, 6774, 6775, 6776, 6787, 6788,
-                                       6789, 6790, 6793, 6795, 6797, 6799, 8905, 8906, 8907, 8910, 8911, 8912,
-                                       8917, 8918, 8919, 8920, 8921, 8922, 8923, 8926, 8927, 8928, 40026};
+const std::vector<int> kUsedStrings = {6701, 6704, 6706, 6707, 6709, 6711, 6712, 6713, 6714, 6715, 6716, 6717,
+                                       6718, 6719, 6720, 6721, 6722, 6723, 6724, 6725, 6726, 6727, 6728, 6729,
+                                       6731, 6732, 6733, 6735, 6740, 6742, 6745, 6747, 6748, 6749, 6750, 6752,
+                                       6761, 6762, 6764, 6766, 6767, 6768, 6769, 6770, 6771, 6772, 6773, 6774,
+                                       6775, 6776, 6777, 6778, 6779, 6780, 6781, 6782, 6783, 6784, 6785, 6786,
+                                       6787, 6788, 6789, 6790, 6793, 6795, 6797, 6799, 8905, 8906, 8907, 8910,
+                                       8911, 8912, 8917, 8918, 8919, 8920, 8921, 8922, 8923, 8926, 8927, 8928,
+                                       40026};
 
 // The printf conversions of a string, in order ("sdd" for "%s ... %d ... %d").
 std::string Conversions(const char* text) {
@@ -69,9 +71,10 @@ TEST(MessageTableTest, MessagesUseOnlyNumberedPlaceholders) {
 // Callers hand these strings to printf-style formatting: a conversion that
 // does not match the arguments would read garbage or crash.
 TEST(MessageTableTest, StringFormatsMatchTheirArguments) {
-  const std::map<int, std::string> formats = {{6704, "s"},   {6715, "s"},  {6740, "ss"},  {6769, "d"},
-                                              {6788, "sdd"}, {6789, "ss"}, {6790, "s"},   {6799, "d"},
-                                              {8911, "ds"},  {8923, "d"},  {40026, "sdd"}};
+  const std::map<int, std::string> formats = {{6704, "s"}, {6715, "s"}, {6716, "s"}, {6729, "ss"}, {6740, "ss"},
+                                              {6769, "d"}, {6779, "s"}, {6782, "s"}, {6784, "s"}, {6786, "s"},
+                                              {6788, "sdd"}, {6789, "ss"}, {6790, "s"}, {6799, "d"}, {8911, "ds"},
+                                              {8923, "d"}, {40026, "sdd"}};
   for (int id : KnownResourceStringIds()) {
     auto it = formats.find(id);
     EXPECT_EQ(Conversions(ResourceString(id)), it == formats.end() ? "" : it->second) << "string " << id;
@@ -111,7 +114,7 @@ TEST(MessageTableTest, FormatMessageInsertsTexts) {
 
 TEST(MessageTableTest, UnknownNumbersHaveNoText) {
   for (int number : {-1, 0, 36, 184, 6701}) EXPECT_EQ(MessageText(number), nullptr) << number;
-  for (int id : {-1, 0, 35, 6700, 6729, 99999}) EXPECT_EQ(ResourceString(id), nullptr) << id;
+  for (int id : {-1, 0, 35, 6700, 6730, 99999}) EXPECT_EQ(ResourceString(id), nullptr) << id;
 }
 
 }  // namespace
