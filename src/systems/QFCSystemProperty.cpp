@@ -228,10 +228,10 @@ void QFCSystemProperty::LoadProperties(Archive& ar) {
   // have been named on Windows, and older documents hold the default file
   // with '\\'), but the current name keeps its case, since Linux opens it
   // with that case.
-  const std::string storedFile = ar.ReadString();
-  if (!QFCFSHelper::EqualNoCase(QFCFileHelper::ToNative(storedFile),
-                                QFCFileHelper::ToNative(failureClassFile_)))
-    TheApp().ReportWarning(kMsgFailureClassFileDiffers, storedFile, failureClassFile_);
+  const std::string storedFile = QFCFileHelper::ToNative(ar.ReadString());
+  const std::string currentFile = QFCFileHelper::ToNative(failureClassFile_);
+  if (!QFCFSHelper::EqualNoCase(storedFile, currentFile))
+    TheApp().ReportWarning(kMsgFailureClassFileDiffers, storedFile, currentFile);
 
   // Stored in the order first, third, second.
   for (int index : {0, 2, 1}) {
