@@ -146,7 +146,8 @@ std::string Outcome(const QFCAbstractFailurePatternPin& pin) {
   std::string out = pin.GetEcuName() + " " + pin.GetPinName() + ": PinConfig " + config + ", ";
   if (pin.GetFailureClassId() < 0) {
     out += "no failure class";
-    return pin.GetRefusalReason().empty() ? out : out + ": " + pin.GetRefusalReason();
+    const std::string reason = pin.GetRefusalReason();
+    return reason.empty() ? out : out + ": " + reason;
   }
   return out + "failure class " + std::to_string(pin.GetFailureClassId()) + ", relay vector " +
          std::to_string(pin.GetRelayVectorIndex());

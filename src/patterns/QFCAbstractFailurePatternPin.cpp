@@ -20,7 +20,14 @@ constexpr int kMsgReadOnly = 118;
 constexpr int kMsgClassNotFound = 126;
 
 constexpr int kResNoFailureClass = 6764;
+constexpr int kResSharedEntry = 6766;
 constexpr int kResNoClass = 6777;
+constexpr int kResNoneDefined = 6778;
+constexpr int kResNoneInFile = 6779;
+constexpr int kResEntriesForbidden = 6780;
+constexpr int kResBoard = 6781;
+constexpr int kResUsedUp = 6782;
+constexpr int kResNothingFits = 6783;
 constexpr int kResEcuDisabled = 6784;
 constexpr int kResNotInPinFile = 6785;
 constexpr int kResModuleSilent = 6786;
@@ -125,12 +132,44 @@ bool QFCAbstractFailurePatternPin::GetDefinedFailureClasses(
   return true;
 }
 
+std::string QFCAbstractFailurePatternPin::GetRefusalReason() const {
+  auto text = [](int id, std::initializer_list<std::string_view> args = {}) {
+    return QFCAbstractFailurePattern::ResourceText(id, args);
+  };
+  switch (refusal_) {
+    case Refusal::kNone:
+      return {};
+    case Refusal::kNoneDefined:
+      return text(kResNoneDefined);
+    case Refusal::kNoneInFile: {
+      std::string ids;
+      for (int i = 0; i < GetDefinedFailureClassCount(); ++i) {
+        std::int32_t id = 0;
+        if (GetDefinedFailureClassId(i, id) == FAULTBOX_OK)
+          ids += (ids.empty() ? "" : ", ") + std::to_string(id);
+      }
+      return text(kResNoneInFile, {ids});
+    }
+    case Refusal::kEntriesForbidden:
+      return text(kResEntriesForbidden);
+    case Refusal::kBoard:
+      return text(kResBoard);
+    case Refusal::kUsedUp:
+      return text(kResUsedUp, {std::to_string(refusalClassId_)});
+    case Refusal::kNothingFits:
+      return text(kResNothingFits);
+    case Refusal::kSharedEntry:
+      return text(kResSharedEntry);
+  }
+  return {};
+}
+
 std::string QFCAbstractFailurePatternPin::GetNotReadyReason() const {
   if (IsReadyForActivation()) return {};
   if (pin_ == nullptr || !IsFromPinFile()) return QFCAbstractFailurePattern::ResourceText(kResNotInPinFile);
   if (!canBeActivated_) {
-    if (!refusalReason_.empty()) return refusalReason_;
-    return QFCAbstractFailurePattern::ResourceText(kResNoClass);
+    std::string reason = GetRefusalReason();
+    return reason.empty() ? QFCAbstractFailurePattern::ResourceText(kResNoClass) : reason;
   }
   const QFCECU* ecu = pin_->GetEcu();
   if (ecu == nullptr || !ecu->IsEnabled())

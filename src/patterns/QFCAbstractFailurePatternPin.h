@@ -89,10 +89,24 @@ class QFCAbstractFailurePatternPin : public QFCAbstractObjectData {
   std::int32_t GetRelayVectorIndex() const { return relayVectorIndex_; }
   const std::string& GetFailureClassText() const { return failureClassText_; }
   void SetFailureClassText(std::string text) { failureClassText_ = std::move(text); }
-  // Why the interlock left the pin without a failure class at its last
-  // check, in words for the user; "" while the pin holds one.
-  const std::string& GetRefusalReason() const { return refusalReason_; }
-  void SetRefusalReason(std::string reason) { refusalReason_ = std::move(reason); }
+  // Why the interlock left the pin without a failure class at its last check.
+  enum class Refusal : std::uint8_t {
+    kNone,              // it holds one, or was not checked
+    kNoneDefined,       // the pin file defines no failure class for it
+    kNoneInFile,        // none of them is in the failure class file
+    kEntriesForbidden,  // every relay vector forbids an entry switched on
+    kBoard,             // the board cannot switch the pin's classes (KR80)
+    kUsedUp,            // a fitting class is used as often as its limit allows
+    kNothingFits,       // no relay vector fits the requirement
+    kSharedEntry,       // the KR60 exclusive-entry rule
+  };
+  void SetRefusal(Refusal refusal, std::int32_t failureClassId = -1) {
+    refusal_ = refusal;
+    refusalClassId_ = failureClassId;
+  }
+  Refusal GetRefusal() const { return refusal_; }
+  // The same in words for the user; "" while the pin holds a class.
+  std::string GetRefusalReason() const;
   // Gives back the use of the class the pin holds and forgets the class:
   // for a pin that leaves its pattern.
   void ReleaseFailureClass();
@@ -107,7 +121,8 @@ class QFCAbstractFailurePatternPin : public QFCAbstractObjectData {
   std::int32_t failureClassId_ = -1;
   std::int32_t relayVectorIndex_ = -1;
   std::string failureClassText_;
-  std::string refusalReason_;
+  Refusal refusal_ = Refusal::kNone;
+  std::int32_t refusalClassId_ = -1;
   bool selected_ = false;
   bool activated_ = false;
   bool canBeActivated_ = false;

@@ -22,13 +22,6 @@ constexpr int kPlaceCheckNoClasses = 6408;
 
 constexpr std::size_t kEntries = QFCAbstractFailurePatternPin::kPinConfigEntries;
 
-constexpr int kResNoneDefined = 6778;
-constexpr int kResNoneInFile = 6779;
-constexpr int kResEntriesForbidden = 6780;
-constexpr int kResBoardCannot = 6781;
-constexpr int kResUsedUp = 6782;
-constexpr int kResNothingFits = 6783;
-
 }  // namespace
 
 void QFCAbstractFailurePatternSafetyInterlock::GetPossibleFailureClasses(
@@ -145,7 +138,7 @@ bool QFCAbstractFailurePatternSafetyInterlock::CheckPinSkeleton(QFCAbstractFailu
 
   MarkModified();
   pin->SetCanBeActivated(false);
-  pin->SetRefusalReason({});
+  pin->SetRefusal(QFCAbstractFailurePatternPin::Refusal::kNone);
 
   GetPossibleFailureClasses(pin, candidates_);
   const std::size_t possible = candidates_.size();
@@ -189,36 +182,34 @@ bool QFCAbstractFailurePatternSafetyInterlock::CheckPinSkeleton(QFCAbstractFailu
   if (!found_.empty() && pin->SetFailureClass(found_))
     pin->SetCanBeActivated(true);
   else
-    pin->SetRefusalReason(WhyNoClass(*pin, *classes, possible, *requirement));
+    NoteWhyNoClass(*pin, *classes, possible, *requirement);
   return true;
 }
 
-// Asked only for a pin that got no class, so a full check of pins that do
-// pays nothing for it.
-std::string QFCAbstractFailurePatternSafetyInterlock::WhyNoClass(
-    const QFCAbstractFailurePatternPin& pin, const QFCAbstractFailureClasses& classes, std::size_t possible,
+// Asked only for a pin that got no class, and without building any text, so
+// that a full check of a large pattern pays next to nothing for it.
+void QFCAbstractFailurePatternSafetyInterlock::NoteWhyNoClass(
+    QFCAbstractFailurePatternPin& pin, const QFCAbstractFailureClasses& classes, std::size_t possible,
     const std::vector<std::uint32_t>& requirement) const {
+  using Refusal = QFCAbstractFailurePatternPin::Refusal;
   const int defined = pin.GetDefinedFailureClassCount();
-  if (defined == 0) return QFCAbstractFailurePattern::ResourceText(kResNoneDefined);
-  std::string ids;
   bool known = false;
-  for (int i = 0; i < defined; ++i) {
+  for (int i = 0; i < defined && !known; ++i) {
     std::int32_t id = 0;
-    if (pin.GetDefinedFailureClassId(i, id) != FAULTBOX_OK) continue;
-    ids += (ids.empty() ? "" : ", ") + std::to_string(id);
-    known = known || classes.FindById(id) != nullptr;
+    known = pin.GetDefinedFailureClassId(i, id) == FAULTBOX_OK && classes.FindById(id) != nullptr;
   }
-  if (!known) return QFCAbstractFailurePattern::ResourceText(kResNoneInFile, {ids});
-  if (possible == 0) return QFCAbstractFailurePattern::ResourceText(kResEntriesForbidden);
-  if (candidates_.empty()) return QFCAbstractFailurePattern::ResourceText(kResBoardCannot);
+  if (defined == 0) return pin.SetRefusal(Refusal::kNoneDefined);
+  if (!known) return pin.SetRefusal(Refusal::kNoneInFile);
+  if (possible == 0) return pin.SetRefusal(Refusal::kEntriesForbidden);
+  if (candidates_.empty()) return pin.SetRefusal(Refusal::kBoard);
   // A class that would fit but is used up is the reason the user can act on.
   for (const QFTFoundFailureClass& candidate : candidates_) {
     const QFCAbstractFailureClass* failureClass = classes.FindById(candidate.failureClassId);
     if (failureClass != nullptr && !failureClass->CanUse() &&
         failureClass->MatchesStates(candidate.relayVectorIndex, requirement))
-      return QFCAbstractFailurePattern::ResourceText(kResUsedUp, {std::to_string(candidate.failureClassId)});
+      return pin.SetRefusal(Refusal::kUsedUp, candidate.failureClassId);
   }
-  return QFCAbstractFailurePattern::ResourceText(kResNothingFits);
+  pin.SetRefusal(Refusal::kNothingFits);
 }
 
 }  // namespace faultbox

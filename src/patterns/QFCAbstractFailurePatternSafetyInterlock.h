@@ -4,7 +4,6 @@
 #pragma once
 
 #include <cstdint>
-#include <string>
 #include <vector>
 
 #include "config/QFCAbstractFailureClasses.h"
@@ -95,12 +94,12 @@ class QFCAbstractFailurePatternSafetyInterlock {
 
  private:
   void MarkModified();
-  // Why a pin got no class: the first of no class defined, none of them in
-  // the failure class file, every relay vector forbidding an entry switched
-  // on (`possible` candidates before the board's filter), the board, a class
-  // used up, or no relay vector fitting the requirement.
-  std::string WhyNoClass(const QFCAbstractFailurePatternPin& pin, const QFCAbstractFailureClasses& classes,
-                         std::size_t possible, const std::vector<std::uint32_t>& requirement) const;
+  // Notes in the pin why it got no class: the first of no class defined,
+  // none of them in the failure class file, every relay vector forbidding an
+  // entry switched on (`possible` candidates before the board's filter), the
+  // board, a class used up, or no relay vector fitting the requirement.
+  void NoteWhyNoClass(QFCAbstractFailurePatternPin& pin, const QFCAbstractFailureClasses& classes,
+                      std::size_t possible, const std::vector<std::uint32_t>& requirement) const;
 
   bool inFullCheck_ = false;
   bool markedInFullCheck_ = false;

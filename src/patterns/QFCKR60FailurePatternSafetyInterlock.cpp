@@ -66,7 +66,7 @@ bool QFCKR60FailurePatternSafetyInterlock::IsRefusedByPlatformRule(
     if (config[e.index] != QFCAbstractFailurePatternPin::kEntryOn) continue;
     if (pattern_->IsEntryUsedByOtherPin(pin, e.kind)) {
       pin->SetFailureClassText(messageText_);
-      pin->SetRefusalReason(messageText_);
+      pin->SetRefusal(QFCAbstractFailurePatternPin::Refusal::kSharedEntry);
       return true;
     }
   }
