@@ -6,6 +6,10 @@ BUILD      ?= build
 ASAN_BUILD ?= build-asan
 FUZZ_BUILD ?= build-fuzz
 JOBS       ?= $(shell nproc 2>/dev/null || echo 2)
+# Objects compiled in one checkout serve any other checkout on the machine
+# (ccache, when installed, keys them by paths relative to the checkout).
+export CCACHE_BASEDIR := $(CURDIR)
+export CCACHE_NOHASHDIR := 1
 # Seconds each fuzz target runs during `make test`.
 FUZZ_SECONDS ?= 20
 

@@ -14,7 +14,7 @@
 #include "config/FailureClassLoader.h"
 #include "config/QFCAbstractFailureClasses.h"
 #include "config/QFCECU.h"
-#include "host/ResultCodes.h"
+#include "platform/ResultCodes.h"
 #include "patterns/QFCAbstractFailurePattern.h"
 #include "platform/CanAccess.h"
 #include "platform/Settings.h"

@@ -27,7 +27,7 @@
 #include "config/QFCAbstractFailureClasses.h"
 #include "config/QFCAbstractHardwareInfo.h"
 #include "config/QFCECU.h"
-#include "host/ResultCodes.h"
+#include "platform/ResultCodes.h"
 #include "kr60/KR60Simulator.h"
 #include "patterns/QFCAbstractFailurePattern.h"
 #include "patterns/QFCAbstractFailurePatternPin.h"

@@ -20,8 +20,8 @@
 #include "patterns/QFCAbstractFailurePatternSafetyInterlock.h"
 #include "patterns/QFCFailurePatternPins.h"
 #include "patterns/QFCFailurePatterns.h"
-#include "patterns/QFCKR40FailurePattern.h"
-#include "patterns/QFCKR60FailurePattern.h"
+#include "patterns/kr40/QFCKR40FailurePattern.h"
+#include "patterns/kr60/QFCKR60FailurePattern.h"
 #include "platform/Settings.h"
 #include "systems/QFCSystem.h"
 

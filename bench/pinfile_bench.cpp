@@ -13,7 +13,7 @@
 #include <string>
 #include <string_view>
 
-#include "config/QFCKR60HardwareInfo.h"
+#include "config/kr60/QFCKR60HardwareInfo.h"
 
 namespace {
 

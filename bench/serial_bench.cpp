@@ -22,7 +22,7 @@
 #include "config/FailureClassLoader.h"
 #include "config/QFCAbstractFailureClasses.h"
 #include "config/QFCECU.h"
-#include "host/ResultCodes.h"
+#include "platform/ResultCodes.h"
 #include "kr40/KR40Simulator.h"
 #include "patterns/QFCAbstractFailurePattern.h"
 #include "patterns/QFCAbstractFailurePatternPin.h"

@@ -10,9 +10,9 @@
 #include <memory>
 #include <string>
 
-#include "config/QFCKR40HardwareInfo.h"
-#include "config/QFCKR60HardwareInfo.h"
-#include "host/QFCFaultboxApp.h"
+#include "config/kr40/QFCKR40HardwareInfo.h"
+#include "config/kr60/QFCKR60HardwareInfo.h"
+#include "platform/QFCReporter.h"
 #include "platform/Archive.h"
 
 namespace {
@@ -67,7 +67,7 @@ void Exercise(faultbox::QFCAbstractHardwareInfo& info) {
 }  // namespace
 
 extern "C" int LLVMFuzzerInitialize(int*, char***) {
-  faultbox::TheApp().StartReporting();
+  faultbox::TheReporter().StartReporting();
   return 0;
 }
 

@@ -9,7 +9,7 @@
 #include "automation/QFCFailurePatternsImpl.h"
 #include "automation/QFCSystemImpl.h"
 #include "automation/QFCSystemsImpl.h"
-#include "host/QFCFaultboxApp.h"
+#include "platform/QFCReporter.h"
 #include "platform/ErrorModule.h"
 
 namespace faultbox::python {
@@ -76,17 +76,19 @@ void ShutDown() {
           operation.Done(Succeeded(active->Deactivate()));
           VARIANT_BOOL still = VARIANT_FALSE;
           // A bench that did not take the deactivation is reset instead.
-          if (Succeeded(active->IsActivated(still)) && still != VARIANT_FALSE) system->ResetHardware();
+          if (Succeeded(active->IsActivated(still)) && still != VARIANT_FALSE)
+            (void)system->ResetHardware();  // its own messages say how it went
         }
         VARIANT_BOOL connected = VARIANT_FALSE;
-        if (Succeeded(system->IsConnected(connected)) && connected != VARIANT_FALSE) system->Disconnect();
+        if (Succeeded(system->IsConnected(connected)) && connected != VARIANT_FALSE)
+          (void)system->Disconnect();  // the process ends either way
       }
     }
     (*g_root)->impl.reset();
     ReleaseScriptHardware();
   }
   if (g_sink != nullptr) {
-    if (ErrorModule* module = TheApp().Module()) module->RemoveSink(g_sink);
+    if (ErrorModule* module = TheReporter().Module()) module->RemoveSink(g_sink);
     g_sink->Close();
   }
 }
@@ -99,7 +101,7 @@ std::shared_ptr<ScriptRoot> FaultInjection() {
     std::lock_guard<std::recursive_mutex> lock(ModelMutex());
     (*g_root)->impl = QFCFaultInjectionImpl::Create();
     InstallScriptHardware();
-    if (ErrorModule* module = TheApp().Module()) {
+    if (ErrorModule* module = TheReporter().Module()) {
       g_sink = new LoggingSink;
       module->AddSink(g_sink);
     }

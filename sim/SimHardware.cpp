@@ -11,7 +11,7 @@
 #include "config/QFCAbstractHardwareInfo.h"
 #include "config/QFCAbstractPin.h"
 #include "config/QFCECU.h"
-#include "host/QFCFaultboxApp.h"
+#include "platform/QFCReporter.h"
 #include "kr40/KR40Simulator.h"
 #include "kr60/KR60Simulator.h"
 #include "platform/ByteTrace.h"
@@ -121,7 +121,7 @@ class KR60SimHardware final : public Hardware {
 
  private:
   bool Failed(const std::string& why) {
-    TheApp().ReportError(kMsgSimulatorFailed, pinFile_, why);
+    TheReporter().ReportError(kMsgSimulatorFailed, pinFile_, why);
     return false;
   }
 
@@ -182,7 +182,7 @@ class KR40SimHardware final : public Hardware {
     std::string error;
     sim_ = sim::KR40Simulator::Start(options, &error);
     if (!sim_) {
-      TheApp().ReportError(kMsgSimulatorFailed, pinFile_, error);
+      TheReporter().ReportError(kMsgSimulatorFailed, pinFile_, error);
       return false;
     }
     port_ = system.GetSerialSettings().portName;

@@ -15,7 +15,7 @@
 #include <vector>
 
 #include "config/QFCFSHelper.h"
-#include "host/QFCFaultboxApp.h"
+#include "platform/QFCReporter.h"
 #include "kr40/KR40Simulator.h"
 #include "kr60/KR60Simulator.h"
 
@@ -338,8 +338,8 @@ int main(int argc, char** argv) {
   }
 
   StderrSink sink(common.verbose);
-  TheApp().StartReporting();
-  if (TheApp().Module()) TheApp().Module()->AddSink(&sink);
+  TheReporter().StartReporting();
+  if (TheReporter().Module()) TheReporter().Module()->AddSink(&sink);
 
   std::unique_ptr<Session> session;
   std::string error;
@@ -360,6 +360,6 @@ int main(int argc, char** argv) {
   int received = 0;
   sigwait(&stopSignals, &received);
   session.reset();
-  if (TheApp().Module()) TheApp().Module()->RemoveSink(&sink);
+  if (TheReporter().Module()) TheReporter().Module()->RemoveSink(&sink);
   return 0;
 }

@@ -9,7 +9,7 @@
 #include <utility>
 #include <vector>
 
-#include "host/ResultCodes.h"
+#include "platform/ResultCodes.h"
 
 namespace faultbox {
 class QFCAbstractFailurePattern;

@@ -9,7 +9,7 @@
 
 #include "Cli.h"
 #include "config/QFCECU.h"
-#include "host/QFCFaultboxApp.h"
+#include "platform/QFCReporter.h"
 #include "patterns/QFCAbstractFailurePattern.h"
 #include "patterns/QFCAbstractFailurePatternPin.h"
 #include "patterns/QFCFailurePatternNode.h"
@@ -79,7 +79,7 @@ struct NewOptions {
 HRESULT NewDocument(const NewOptions& o) {
   // A new document never replaces a file: that file may hold a bench's patterns.
   if (QFCFileHelper::Exists(o.out)) {
-    TheApp().ReportError(kMsgCannotWriteFile, o.out, "it exists already; a new document does not replace it");
+    TheReporter().ReportError(kMsgCannotWriteFile, o.out, "it exists already; a new document does not replace it");
     return E_FAULTBOX;
   }
   QFCSystemAdmin admin;
@@ -212,7 +212,7 @@ HRESULT EnableEcu(QFCFaultboxDoc& doc, const std::string& name, bool enable, std
     ++count;
   }
   if (count == 0) {
-    TheApp().ReportError(kMsgNoSuchEcu, name);
+    TheReporter().ReportError(kMsgNoSuchEcu, name);
     return E_FAULTBOX_INVALID_PARAMETER;
   }
   done = "ECU " + name + (enable ? " enabled" : " disabled");

@@ -11,7 +11,7 @@
 #include "Cli.h"
 #include "config/FailureClassLoader.h"
 #include "config/FailureClassSource.h"
-#include "host/QFCFaultboxApp.h"
+#include "platform/QFCReporter.h"
 #include "platform/AtomicFile.h"
 
 namespace faultbox::cli {
@@ -36,7 +36,7 @@ HRESULT Build(const BuildArgs& args) {
   std::string error;
   std::optional<std::vector<std::uint8_t>> bytes = ReadWholeFile(args.source, &error);
   if (!bytes) {
-    TheApp().ReportError(kMsgCannotReadFile, args.source, error);
+    TheReporter().ReportError(kMsgCannotReadFile, args.source, error);
     return E_FAULTBOX_CANN_NOT_OPEN_FILE;
   }
   std::unique_ptr<QFCAbstractFailureClasses> classes;
@@ -44,7 +44,7 @@ HRESULT Build(const BuildArgs& args) {
   HRESULT hr = ParseFailureClassSource(text, args.source, &classes);
   if (Failed(hr)) return hr;
   if (!WriteFileAtomic(args.output, StoreFailureClasses(*classes), &error)) {
-    TheApp().ReportError(kMsgCannotWriteFile, args.output, error);
+    TheReporter().ReportError(kMsgCannotWriteFile, args.output, error);
     return E_FAULTBOX_CANN_NOT_OPEN_FILE;
   }
   std::printf("%s: %d failure classes, platform %s, version \"%s\"\n", args.output.c_str(),

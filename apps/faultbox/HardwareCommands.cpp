@@ -29,7 +29,7 @@
 #include "config/QFCAbstractHardwareInfo.h"
 #include "config/QFCAbstractPin.h"
 #include "config/QFCECU.h"
-#include "host/QFCFaultboxApp.h"
+#include "platform/QFCReporter.h"
 #include "patterns/QFCAbstractFailurePattern.h"
 #include "patterns/QFCAbstractFailurePatternPin.h"
 #include "patterns/QFCFailurePatternPins.h"
@@ -298,7 +298,7 @@ class Session {
         Reset();
       }
       if (system_->HasActivatedPattern(active)) {
-        TheApp().ReportError(kMsgStillSwitched, active->GetName(), system_->GetName());
+        TheReporter().ReportError(kMsgStillSwitched, active->GetName(), system_->GetName());
         return Succeeded(result) ? E_FAULTBOX : result;
       }
     }
@@ -325,7 +325,7 @@ class Session {
     // The file must be writable before the hardware is touched.
     std::FILE* probe = std::fopen(options_.trace.c_str(), "ae");
     if (probe == nullptr) {
-      TheApp().ReportError(kMsgCannotWriteFile, options_.trace, std::strerror(errno));
+      TheReporter().ReportError(kMsgCannotWriteFile, options_.trace, std::strerror(errno));
       return false;
     }
     std::fclose(probe);
@@ -544,7 +544,7 @@ class Shell {
     if (name == "quit" || name == "exit") return false;
     const ShellCommand* command = FindShellCommand(name);
     if (command == nullptr) {
-      TheApp().ReportError(kMsgUnknownCommand, name);
+      TheReporter().ReportError(kMsgUnknownCommand, name);
       result = E_FAULTBOX_INVALID_PARAMETER;
       return true;
     }
@@ -559,7 +559,7 @@ class Shell {
 
  private:
   HRESULT Usage(const std::string& name, const std::string& what) {
-    TheApp().ReportError(kMsgCommandUsage, name, what);
+    TheReporter().ReportError(kMsgCommandUsage, name, what);
     return E_FAULTBOX_INVALID_PARAMETER;
   }
   HRESULT WrongUse(const ShellCommand& command) {
@@ -729,7 +729,7 @@ HRESULT RunShell(const HardwareOptions& o) {
     failed = true;
   }
   if (!Succeeded(session.SwitchOffAndDisconnect())) failed = true;
-  if (session.System().IsModified()) TheApp().ReportWarning(kMsgNotSaved, session.Doc().GetPathName());
+  if (session.System().IsModified()) TheReporter().ReportWarning(kMsgNotSaved, session.Doc().GetPathName());
   return failed ? E_FAULTBOX : FAULTBOX_OK;
 }
 

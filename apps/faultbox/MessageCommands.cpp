@@ -4,7 +4,7 @@
 #include <vector>
 
 #include "Cli.h"
-#include "host/QFCFaultboxApp.h"
+#include "platform/QFCReporter.h"
 #include "platform/MessageTable.h"
 
 namespace faultbox::cli {
@@ -18,7 +18,7 @@ void RegisterMessageCommands(CLI::App& app, Context& ctx) {
     for (int number : list) {
       const char* text = MessageText(number);
       if (!text) {
-        TheApp().ReportError(kMsgUnknownMessage, std::to_string(number));
+        TheReporter().ReportError(kMsgUnknownMessage, std::to_string(number));
         ctx.result = E_FAULTBOX_INVALID_PARAMETER;
         continue;
       }

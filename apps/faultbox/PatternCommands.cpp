@@ -8,7 +8,7 @@
 #include <vector>
 
 #include "Cli.h"
-#include "host/QFCFaultboxApp.h"
+#include "platform/QFCReporter.h"
 #include "patterns/QFCAbstractFailurePattern.h"
 #include "patterns/QFCAbstractFailurePatternPin.h"
 #include "patterns/QFCFailurePatternNode.h"
@@ -26,7 +26,7 @@ constexpr int kMsgPatternActivated = 127;
 
 QFCAbstractFailurePattern* FindPattern(QFCFaultboxDoc& doc, const std::string& name) {
   QFCAbstractFailurePattern* pattern = doc.GetSystem()->FindPattern(name);
-  if (pattern == nullptr) TheApp().ReportError(kMsgNoSuchPattern, name, doc.GetPathName());
+  if (pattern == nullptr) TheReporter().ReportError(kMsgNoSuchPattern, name, doc.GetPathName());
   return pattern;
 }
 
@@ -36,7 +36,7 @@ bool FindPatternPins(QFCAbstractFailurePattern& pattern, const std::vector<PinNa
   for (const PinName& name : names) {
     QFCAbstractFailurePatternPin* pin = pattern.GetPins()->FindPin(name.second, name.first);
     if (pin == nullptr) {
-      TheApp().ReportError(kMsgPinNotInPattern, name.second, name.first);
+      TheReporter().ReportError(kMsgPinNotInPattern, name.second, name.first);
       all = false;
     }
     pins.push_back(pin);
@@ -61,7 +61,7 @@ HRESULT Create(QFCFaultboxDoc& doc, const PatternOptions& o, std::string& done) 
   // The model notes a name in use only as a class 0 note; here it is the
   // reason the command fails.
   if (!o.name.empty() && system.FindPattern(o.name) != nullptr) {
-    TheApp().ReportError(kMsgNameInUse);
+    TheReporter().ReportError(kMsgNameInUse);
     return E_FAULTBOX_NAME_NOT_UNIQUE;
   }
   QFCAbstractFailurePattern* pattern = nullptr;
@@ -97,7 +97,7 @@ HRESULT Reset(QFCFaultboxDoc& doc, const PatternOptions& o, std::string& done) {
   // Reset itself answers only how the interlock fared afterwards; its
   // refusals are asked first so that they are not taken for success.
   if (pattern->IsAnyPinActivated()) {
-    TheApp().ReportError(kMsgPatternActivated);
+    TheReporter().ReportError(kMsgPatternActivated);
     return E_FAULTBOX_FAILURE_PATTERN_ARE_ACTIVATED;
   }
   if (!pattern->CheckWritable()) return E_FAULTBOX;
@@ -114,7 +114,7 @@ HRESULT AddPins(QFCFaultboxDoc& doc, const PatternOptions& o, std::string& done)
   for (const PinName& name : o.pins) {
     QFCAbstractPin* pin = doc.GetSystem()->FindPin(name.first, name.second);
     if (pin == nullptr) {
-      TheApp().ReportError(kMsgNoSuchPin, name.second, name.first);
+      TheReporter().ReportError(kMsgNoSuchPin, name.second, name.first);
       all = false;
     }
     pins.push_back(pin);
@@ -190,7 +190,7 @@ HRESULT ConfigurePatternPins(QFCFaultboxDoc& doc, const PatternOptions& o, std::
   for (QFCAbstractFailurePatternPin* pin : pins) {
     // An activated pin refuses the change without a message of its own.
     if (!pin->SetPinConfig(o.entry, static_cast<std::uint32_t>(o.value), true)) {
-      if (pin->IsActivated()) TheApp().ReportError(kMsgPatternActivated);
+      if (pin->IsActivated()) TheReporter().ReportError(kMsgPatternActivated);
       return E_FAULTBOX;
     }
     done += (done.empty() ? "" : "\n") + Outcome(*pin);

@@ -7,9 +7,9 @@
 #include <string>
 
 #include "Cli.h"
-#include "config/QFCKR40HardwareInfo.h"
-#include "config/QFCKR60HardwareInfo.h"
-#include "host/QFCFaultboxApp.h"
+#include "config/kr40/QFCKR40HardwareInfo.h"
+#include "config/kr60/QFCKR60HardwareInfo.h"
+#include "platform/QFCReporter.h"
 
 namespace faultbox::cli {
 namespace {
@@ -56,7 +56,7 @@ const char* PlatformName(std::int32_t platform) {
 
 std::string BoardType(const Loaded& l) {
   std::string board;
-  if (l.info && l.info->GetFormatTable()) l.info->GetFormatValue("BoardType", board);
+  if (l.info && l.info->GetFormatTable() && l.info->GetFormatValue("BoardType", board) != FAULTBOX_OK) board.clear();
   return board;
 }
 
@@ -122,7 +122,7 @@ HRESULT Check(const PinfileOptions& o) {
         break;
       }
       if (extra.platform != main.platform) {
-        TheApp().ReportInternal(86, name);
+        TheReporter().ReportInternal(86, name);
         result = E_FAULTBOX_CONSISTENCY_CHECK;
         break;
       }

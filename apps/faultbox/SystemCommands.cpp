@@ -35,12 +35,7 @@ const char* PlatformName(std::int32_t platform) {
 }
 
 // The board type as the pin file writes it; the system keeps it only for the KR40 family.
-std::string BoardType(const QFCSystem& system) {
-  if (!system.GetBoardType().empty() || system.GetHardwareInfos().empty()) return system.GetBoardType();
-  std::string value;
-  system.GetHardwareInfos().front()->GetFormatValue("BoardType", value);
-  return value;
-}
+std::string BoardType(const QFCSystem& system) { return system.GetPinFileBoardType(); }
 
 std::string Join(const std::vector<std::string>& list) {
   std::string out;
@@ -68,7 +63,8 @@ std::vector<LoadAddress> ReadLoadAddresses(const QFCSystem& system) {
 
 nlohmann::json InterfaceJson(const QFCSystem& system) {
   std::int32_t deviceType = -1, value1 = -1, value2 = -1;
-  system.GetInterfaceParameter(deviceType, value1, value2);
+  // It always answers; the values stay -1 for a system without a platform.
+  (void)system.GetInterfaceParameter(deviceType, value1, value2);
   nlohmann::json out = {{"device_type", deviceType}, {"value1", value1}, {"value2", value2}};
   if (system.GetPlatformType() == fptKR40Platform) {
     out["port_name"] = system.GetSerialSettings().portName;
@@ -153,7 +149,8 @@ void PrintText(const QFCSystem* system, HRESULT result) {
       std::printf("  version: %s, %d classes\n", fc->GetVersion().c_str(), fc->GetCount());
 
     std::int32_t deviceType = -1, value1 = -1, value2 = -1;
-    system->GetInterfaceParameter(deviceType, value1, value2);
+    // It always answers; the values stay -1 for a system without a platform.
+    (void)system->GetInterfaceParameter(deviceType, value1, value2);
     if (system->GetPlatformType() == fptKR40Platform) {
       std::printf("interface: serial port %s (device type %d, port %d)\n",
                   system->GetSerialSettings().portName.c_str(), deviceType, value1);

@@ -7,7 +7,7 @@
 #include <vector>
 
 #include "Cli.h"
-#include "host/QFCFaultboxApp.h"
+#include "platform/QFCReporter.h"
 #include "platform/Settings.h"
 
 namespace faultbox::cli {
@@ -22,7 +22,7 @@ const char* ClassWord(int errorClass, int number) {
     case 1:
       return "info";
     default:
-      return number == QFCFaultboxApp::kInternalFault ? "internal" : "note";
+      return number == QFCReporter::kInternalFault ? "internal" : "note";
   }
 }
 
@@ -34,7 +34,7 @@ class TextSink : public MessageSink {
  public:
   explicit TextSink(const Verbosity& verbosity) : verbosity_(verbosity) {}
   void Display(const ErrorRecord& r, bool) override {
-    const bool error = r.errorClass == 3 || r.number == QFCFaultboxApp::kInternalFault;
+    const bool error = r.errorClass == 3 || r.number == QFCReporter::kInternalFault;
     const bool shown =
         error || (r.errorClass == 2 && verbosity_ != Verbosity::kQuiet) || verbosity_ == Verbosity::kVerbose;
     if (shown) {
@@ -122,8 +122,8 @@ int main(int argc, char** argv) {
     verbosity = quiet ? Verbosity::kQuiet : verbose ? Verbosity::kVerbose : Verbosity::kNormal;
     if (!configFile.empty()) Settings::SetPathOverride(configFile);
     ctx.json = messages == "json";
-    TheApp().StartReporting();
-    TheApp().Module()->AddSink(ctx.json ? static_cast<MessageSink*>(&jsonSink) : &textSink);
+    TheReporter().StartReporting();
+    TheReporter().Module()->AddSink(ctx.json ? static_cast<MessageSink*>(&jsonSink) : &textSink);
   });
 
   try {
@@ -133,9 +133,9 @@ int main(int argc, char** argv) {
     return code == 0 ? 0 : 2;
   }
   // Anything still on the stack (reported without being shown) is shown now.
-  if (TheApp().Module()) {
-    TheApp().ErrorAdapter().DisplayAllErrors(0, false);
-    TheApp().StopReporting();
+  if (TheReporter().Module()) {
+    TheReporter().ErrorAdapter().DisplayAllErrors(0, false);
+    TheReporter().StopReporting();
   }
   if (!Succeeded(ctx.result) && verbosity == Verbosity::kNormal) textSink.ShowHeldNotes();
   return Succeeded(ctx.result) ? 0 : 1;

@@ -13,9 +13,9 @@
 #include <cstring>
 #include <ctime>
 
-#include "config/QFCKR40HardwareInfo.h"
-#include "config/QFCKR40Pin.h"
-#include "host/ResultCodes.h"
+#include "config/kr40/QFCKR40HardwareInfo.h"
+#include "config/kr40/QFCKR40Pin.h"
+#include "platform/ResultCodes.h"
 #include "platform/PseudoTerminal.h"
 
 namespace faultbox::sim {
@@ -59,7 +59,7 @@ bool ReadPinFileModules(const KR40SimulatorOptions& options, std::set<std::uint3
     return Fail(error, "pin file " + options.pinFile + " is not for a KR40 or KR80 bench");
   }
   std::string board;
-  info.GetFormatValue("BoardType", board);
+  if (info.GetFormatValue("BoardType", board) != FAULTBOX_OK) board.clear();
   if (ProtocolForBoardType(board) != options.protocol) {
     // The host picks the protocol from the board type: a bench speaking the
     // other one would only ever see garbage.

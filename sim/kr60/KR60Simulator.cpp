@@ -8,9 +8,9 @@
 #include <thread>
 
 #include "config/QFCFSHelper.h"
-#include "config/QFCKR60HardwareInfo.h"
-#include "config/QFCKR60Pin.h"
-#include "host/ResultCodes.h"
+#include "config/kr60/QFCKR60HardwareInfo.h"
+#include "config/kr60/QFCKR60Pin.h"
+#include "platform/ResultCodes.h"
 
 namespace faultbox::sim {
 namespace {
@@ -126,7 +126,7 @@ bool ReadPinFile(const KR60SimulatorOptions& options, std::optional<std::uint32_
   if (hr != FAULTBOX_OK) return Fail(error, "cannot load pin file " + file + ": " + ResultCodeText(hr));
 
   std::string value;
-  info.GetFormatValue("OffsetLoadAddress", value);
+  if (info.GetFormatValue("OffsetLoadAddress", value) != FAULTBOX_OK) value.clear();
   const std::string_view text = QFCFSHelper::Trim(value);
   std::uint32_t number = 0;
   if (!offset) {

@@ -1,5 +1,6 @@
 // Index look-up of the collection wrappers.
 #include "automation/AutomationLookup.h"
+#include "platform/MessageTable.h"
 
 #include "automation/QFCAutomationCall.h"
 #include "patterns/QFCAbstractFailurePattern.h"
@@ -11,10 +12,10 @@ constexpr int kTextNoIndex = 6713;
 }
 
 std::string AutomationText(int id, std::initializer_list<std::string_view> args) {
-  return QFCAbstractFailurePattern::ResourceText(id, args);
+  return ResourceText(id, args);
 }
 
-HRESULT ResolveIndex(const Variant& index, int count,
+[[nodiscard]] HRESULT ResolveIndex(const Variant& index, int count,
                      const std::function<int(const std::string&)>& findByName, int notFoundText,
                      int& position, const std::string& ecuName) {
   position = -1;

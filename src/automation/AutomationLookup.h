@@ -14,7 +14,7 @@ namespace faultbox {
 // string 6713, one that selects nothing with `notFoundText` followed by the
 // name (and `ecuName`, when given) or position looked for; both as
 // E_FAULTBOX_INVALID_PARAMETER.
-HRESULT ResolveIndex(const Variant& index, int count,
+[[nodiscard]] HRESULT ResolveIndex(const Variant& index, int count,
                      const std::function<int(const std::string&)>& findByName, int notFoundText,
                      int& position, const std::string& ecuName = {});
 

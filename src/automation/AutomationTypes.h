@@ -10,7 +10,7 @@
 #include <variant>
 #include <vector>
 
-#include "host/ResultCodes.h"
+#include "platform/ResultCodes.h"
 
 namespace faultbox {
 

@@ -1,5 +1,6 @@
 // The automation call frame and the per-thread error information.
 #include "automation/QFCAutomationCall.h"
+#include "platform/MessageTable.h"
 
 #include <algorithm>
 #include <atomic>
@@ -118,7 +119,7 @@ HRESULT QFCAutomationCall::Detached(const std::string& keptText) {
   return RaiseError(E_FAULTBOX, keptText);
 }
 
-HRESULT RaiseError(HRESULT code, std::string description) {
+[[nodiscard]] HRESULT RaiseError(HRESULT code, std::string description) {
   t_errorInfo = QFTErrorInfo{code, std::move(description)};
   return code;
 }
@@ -132,7 +133,7 @@ bool GetErrorInfo(QFTErrorInfo& info) {
 std::string ErrorDescriptionOfCode(HRESULT code) {
   for (const CodeText& entry : kCodeTexts)
     // The file name is not known here; the member that knows it names it.
-    if (entry.code == code) return QFCAbstractFailurePattern::ResourceText(entry.resource, {""});
+    if (entry.code == code) return ResourceText(entry.resource, {""});
   return {};
 }
 

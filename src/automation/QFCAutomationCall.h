@@ -5,7 +5,7 @@
 
 #include <string>
 
-#include "host/ResultCodes.h"
+#include "platform/ResultCodes.h"
 #include "platform/ThreadReportCollector.h"
 
 namespace faultbox {
@@ -32,9 +32,9 @@ class QFCAutomationCall {
   // the description of its code, or, when the code says no more than that
   // the member failed, the texts of the errors (else warnings) reported
   // during the call; codes without either get none.
-  HRESULT Return(HRESULT code);
+  [[nodiscard]] HRESULT Return(HRESULT code);
   // The wrapper's model object is gone: E_FAULTBOX with the kept text.
-  HRESULT Detached(const std::string& keptText);
+  [[nodiscard]] HRESULT Detached(const std::string& keptText);
 
  private:
   ThreadReportCollector reported_;
@@ -47,7 +47,7 @@ std::string ReasonsReportedInCall();
 
 // Sets the thread's error information and answers `code`, for a member that
 // knows more than its code says.
-HRESULT RaiseError(HRESULT code, std::string description);
+[[nodiscard]] HRESULT RaiseError(HRESULT code, std::string description);
 // The error information of the last member called on this thread that failed
 // with one; false when there is none.
 bool GetErrorInfo(QFTErrorInfo& info);

@@ -22,11 +22,11 @@ class QFCFailureClassesImpl : public QFCOwnerProvider<QFCSystem>,
   explicit QFCFailureClassesImpl(QFCSystem* owner) : QFCOwnerProvider(owner) {}
 
   // By name (exactly) or position.
-  HRESULT Item(const Variant& index, std::shared_ptr<class QFCFailureClassImpl>& failureClass);
-  HRESULT get_Count(std::int32_t& count);
-  HRESULT get_Names(std::vector<std::string>& names);
-  HRESULT get_Version(std::string& version);
-  HRESULT get__NewEnum(std::shared_ptr<QFCEnumVariant>& newEnum);
+  [[nodiscard]] HRESULT Item(const Variant& index, std::shared_ptr<class QFCFailureClassImpl>& failureClass);
+  [[nodiscard]] HRESULT get_Count(std::int32_t& count);
+  [[nodiscard]] HRESULT get_Names(std::vector<std::string>& names);
+  [[nodiscard]] HRESULT get_Version(std::string& version);
+  [[nodiscard]] HRESULT get__NewEnum(std::shared_ptr<QFCEnumVariant>& newEnum);
 
   // For the enumerator.
   int LiveCount() const;
@@ -38,13 +38,13 @@ class QFCFailureClassImpl : public QFCOwnerProvider<QFCAbstractFailureClass> {
   QFCFailureClassImpl(QFCAbstractFailureClass* owner, QFCSystem* system)
       : QFCOwnerProvider(owner), system_(system) {}
 
-  HRESULT get_Name(std::string& name);
-  HRESULT get_Description(std::string& description);
-  HRESULT get_Limitation(std::string& limitation);
-  HRESULT get_Format(std::string& format);
-  HRESULT get_ID(std::int32_t& id);
+  [[nodiscard]] HRESULT get_Name(std::string& name);
+  [[nodiscard]] HRESULT get_Description(std::string& description);
+  [[nodiscard]] HRESULT get_Limitation(std::string& limitation);
+  [[nodiscard]] HRESULT get_Format(std::string& format);
+  [[nodiscard]] HRESULT get_ID(std::int32_t& id);
   // The number of relay vectors of the class.
-  HRESULT get_RelayVectorSize(std::int32_t& size);
+  [[nodiscard]] HRESULT get_RelayVectorSize(std::int32_t& size);
 
   // Also detaches a wrapper whose class left its system's collection.
   bool IsAttached() const override;
@@ -52,7 +52,7 @@ class QFCFailureClassImpl : public QFCOwnerProvider<QFCAbstractFailureClass> {
 
  private:
   template <class Body>
-  HRESULT Read(Body&& body);
+  [[nodiscard]] HRESULT Read(Body&& body);
 
   QFCSystem* system_;
 };

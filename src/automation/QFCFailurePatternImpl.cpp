@@ -10,13 +10,13 @@
 #include "automation/QFCFailurePatternPinImpl.h"
 #include "automation/QFCFailurePatternPinsImpl.h"
 #include "automation/QFCInterfaceProvider.h"
-#include "comm/QFCCANMessageBuilder.h"
-#include "host/QFCFaultboxApp.h"
+#include "patterns/kr60/QFCCANMessageBuilder.h"
+#include "platform/QFCReporter.h"
 #include "patterns/QFCAbstractFailurePatternPin.h"
 #include "patterns/QFCFailurePatternPins.h"
-#include "patterns/QFCKR40FailurePattern.h"
-#include "patterns/QFCKR60FailurePattern.h"
-#include "patterns/QFCKR60FailurePatternPin.h"
+#include "patterns/kr40/QFCKR40FailurePattern.h"
+#include "patterns/kr60/QFCKR60FailurePattern.h"
+#include "patterns/kr60/QFCKR60FailurePatternPin.h"
 
 namespace faultbox {
 
@@ -106,7 +106,7 @@ HRESULT QFCBaseFailurePatternImpl::Switch(const Variant& pins, bool activate) {
     for (QFCAbstractFailurePatternPin* pin : chosen) pin->SetSelected(true);
     const HRESULT result = pattern.ActivatePattern(activate);
     if (result == FAULTBOX_OK)
-      TheApp().ReportInfo(activate ? kMsgActivated : kMsgDeactivated, pattern.GetName());
+      TheReporter().ReportInfo(activate ? kMsgActivated : kMsgDeactivated, pattern.GetName());
     return result;
   });
 }

@@ -19,17 +19,17 @@ class QFCBaseFailurePatternImpl : public QFCOwnerProvider<QFCAbstractFailurePatt
   // platform; nullptr for a pattern of neither platform.
   static std::shared_ptr<QFCBaseFailurePatternImpl> Of(QFCAbstractFailurePattern& pattern);
 
-  HRESULT get_Pins(std::shared_ptr<QFCFailurePatternPinsImpl>& failurePatternPins);
-  HRESULT get_Name(std::string& name);
-  HRESULT IsActivated(VARIANT_BOOL& isActivated);
+  [[nodiscard]] HRESULT get_Pins(std::shared_ptr<QFCFailurePatternPinsImpl>& failurePatternPins);
+  [[nodiscard]] HRESULT get_Name(std::string& name);
+  [[nodiscard]] HRESULT IsActivated(VARIANT_BOOL& isActivated);
   // Omitted `pins`: the whole pattern. An array of pin objects: the pins of
   // this pattern among them whose state differs. Every element is checked
   // before anything is switched. Message 165 or 167 on success.
-  HRESULT Activate(const Variant& pins = {});
-  HRESULT Deactivate(const Variant& pins = {});
+  [[nodiscard]] HRESULT Activate(const Variant& pins = {});
+  [[nodiscard]] HRESULT Deactivate(const Variant& pins = {});
   // E_FAULTBOX_FAILURE_PATTERN_ARE_ACTIVATED, changing nothing, while a pin
   // is activated.
-  HRESULT Reset();
+  [[nodiscard]] HRESULT Reset();
 
   void Detach() override;
 
@@ -37,7 +37,7 @@ class QFCBaseFailurePatternImpl : public QFCOwnerProvider<QFCAbstractFailurePatt
   explicit QFCBaseFailurePatternImpl(QFCAbstractFailurePattern* owner) : QFCOwnerProvider(owner) {}
 
  private:
-  HRESULT Switch(const Variant& pins, bool activate);
+  [[nodiscard]] HRESULT Switch(const Variant& pins, bool activate);
 
   std::shared_ptr<QFCFailurePatternPinsImpl> pins_;
 };
@@ -53,11 +53,11 @@ class QFCFailurePatternKR60Impl : public QFCBaseFailurePatternImpl {
 
   // "0x..." in upper-case hex: the FIU vector with the bit of every FIU relay
   // (position 5 on) that a pin's adjusted relay vector switches on cleared.
-  HRESULT get_FIURelayState(std::string& state);
+  [[nodiscard]] HRESULT get_FIURelayState(std::string& state);
   // The RSIM relay word in the same form, with the resistor when it is connected.
-  HRESULT get_RsimRelayState(std::string& state);
-  HRESULT get_ResistorValue(std::int32_t& value);
-  HRESULT put_ResistorValue(std::int32_t value);
+  [[nodiscard]] HRESULT get_RsimRelayState(std::string& state);
+  [[nodiscard]] HRESULT get_ResistorValue(std::int32_t& value);
+  [[nodiscard]] HRESULT put_ResistorValue(std::int32_t value);
 };
 
 }  // namespace faultbox

@@ -5,12 +5,12 @@
 #include "automation/QFCInterfaceProvider.h"
 #include "automation/QFCSystemImpl.h"
 #include "config/QFCAbstractPin.h"
-#include "config/QFCKR60Pin.h"
-#include "host/QFCFaultboxApp.h"
+#include "config/kr60/QFCKR60Pin.h"
+#include "platform/QFCReporter.h"
 #include "patterns/QFCAbstractFailurePattern.h"
 #include "patterns/QFCAbstractFailurePatternPin.h"
-#include "patterns/QFCKR40FailurePatternPin.h"
-#include "patterns/QFCKR60FailurePatternPin.h"
+#include "patterns/kr40/QFCKR40FailurePatternPin.h"
+#include "patterns/kr60/QFCKR60FailurePatternPin.h"
 #include "systems/QFCSystem.h"
 
 namespace faultbox {
@@ -140,7 +140,7 @@ HRESULT QFCBaseFailurePatternPinImpl::Switch(bool activate) {
     pin.SetSelected(true);
     const HRESULT result = pattern.ActivatePattern(activate);
     if (result == FAULTBOX_OK)
-      TheApp().ReportInfo(activate ? kMsgActivated : kMsgDeactivated, pattern.GetName());
+      TheReporter().ReportInfo(activate ? kMsgActivated : kMsgDeactivated, pattern.GetName());
     return result;
   });
 }

@@ -22,37 +22,37 @@ class QFCBaseFailurePatternPinImpl : public QFCOwnerProvider<QFCAbstractFailureP
   // The pin holds a failure class and relay vector.
   static bool HasConfiguredClass(const QFCAbstractFailurePatternPin& pin);
 
-  HRESULT get_Name(std::string& name);
-  HRESULT get_EcuName(std::string& ecuName);
+  [[nodiscard]] HRESULT get_Name(std::string& name);
+  [[nodiscard]] HRESULT get_EcuName(std::string& ecuName);
   // E_FAULTBOX_FAILURECLASS_NOT_CONFIGURATED for a pin without a failure class.
-  HRESULT Select();
-  HRESULT Deselect();
-  HRESULT IsSelected(VARIANT_BOOL& isSelected);
-  HRESULT IsActivated(VARIANT_BOOL& isActivated);
-  HRESULT CanBeActivated(VARIANT_BOOL& canActivate);
+  [[nodiscard]] HRESULT Select();
+  [[nodiscard]] HRESULT Deselect();
+  [[nodiscard]] HRESULT IsSelected(VARIANT_BOOL& isSelected);
+  [[nodiscard]] HRESULT IsActivated(VARIANT_BOOL& isActivated);
+  [[nodiscard]] HRESULT CanBeActivated(VARIANT_BOOL& canActivate);
   // nullptr and success for a pin without a failure class.
-  HRESULT get_AdjustedFailureClass(std::shared_ptr<QFCFailureClassImpl>& failureClass);
+  [[nodiscard]] HRESULT get_AdjustedFailureClass(std::shared_ptr<QFCFailureClassImpl>& failureClass);
   // This pin alone: every other pin of the pattern is deselected.
-  HRESULT Activate();
-  HRESULT Deactivate();
+  [[nodiscard]] HRESULT Activate();
+  [[nodiscard]] HRESULT Deactivate();
   // An omitted relay vector is the class's first (0).
-  HRESULT SetFailureClass(std::int32_t failureClassId, const Variant& relayVector = {});
-  HRESULT get_DefinedFailureClasses(std::vector<std::int32_t>& definedFailureClasses);
-  HRESULT get_ModuleChannel(std::vector<std::int32_t>& channels);
-  HRESULT get_PinConfig(std::vector<std::int32_t>& pinConfig);
+  [[nodiscard]] HRESULT SetFailureClass(std::int32_t failureClassId, const Variant& relayVector = {});
+  [[nodiscard]] HRESULT get_DefinedFailureClasses(std::vector<std::int32_t>& definedFailureClasses);
+  [[nodiscard]] HRESULT get_ModuleChannel(std::vector<std::int32_t>& channels);
+  [[nodiscard]] HRESULT get_PinConfig(std::vector<std::int32_t>& pinConfig);
   // ID 0 and relay vector -1 when the pin has no failure class.
-  HRESULT get_AdjustedFailureClassID(std::int32_t& id, std::int32_t& relayVector);
+  [[nodiscard]] HRESULT get_AdjustedFailureClassID(std::int32_t& id, std::int32_t& relayVector);
   // E_FAULTBOX_FAILURE_PATTERN_ARE_ACTIVATED, changing nothing, for an activated pin.
-  HRESULT Reset();
+  [[nodiscard]] HRESULT Reset();
   // Extension: why the safety interlock left the pin without a failure class
   // at its last check; "" while the pin holds one.
-  HRESULT get_RefusalReason(std::string& reason);
+  [[nodiscard]] HRESULT get_RefusalReason(std::string& reason);
 
  protected:
   explicit QFCBaseFailurePatternPinImpl(QFCAbstractFailurePatternPin* owner) : QFCOwnerProvider(owner) {}
 
  private:
-  HRESULT Switch(bool activate);
+  [[nodiscard]] HRESULT Switch(bool activate);
 };
 
 class QFCFailurePatternKR40PinImpl : public QFCBaseFailurePatternPinImpl {
@@ -60,7 +60,7 @@ class QFCFailurePatternKR40PinImpl : public QFCBaseFailurePatternPinImpl {
   explicit QFCFailurePatternKR40PinImpl(QFCAbstractFailurePatternPin* owner)
       : QFCBaseFailurePatternPinImpl(owner) {}
   // The FIU module number of the pin.
-  HRESULT get_ModuleAddress(std::int32_t& address);
+  [[nodiscard]] HRESULT get_ModuleAddress(std::int32_t& address);
 };
 
 class QFCFailurePatternKR60PinImpl : public QFCBaseFailurePatternPinImpl {
@@ -68,7 +68,7 @@ class QFCFailurePatternKR60PinImpl : public QFCBaseFailurePatternPinImpl {
   explicit QFCFailurePatternKR60PinImpl(QFCAbstractFailurePatternPin* owner)
       : QFCBaseFailurePatternPinImpl(owner) {}
   // Cabinet, rack and slot of the pin's load module.
-  HRESULT get_ModuleAddress(std::int32_t& cabinet, std::int32_t& rack, std::int32_t& slot);
+  [[nodiscard]] HRESULT get_ModuleAddress(std::int32_t& cabinet, std::int32_t& rack, std::int32_t& slot);
 };
 
 }  // namespace faultbox

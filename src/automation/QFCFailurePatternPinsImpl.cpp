@@ -16,7 +16,7 @@ namespace {
 constexpr int kTextNoPin = 6718;
 constexpr int kTextNoSystemPin = 6729;
 
-HRESULT Resolve(const QFCFailurePatternPins& pins, const Variant& index, const std::string& ecuName,
+[[nodiscard]] HRESULT Resolve(const QFCFailurePatternPins& pins, const Variant& index, const std::string& ecuName,
                 QFCAbstractFailurePatternPin*& pin) {
   pin = nullptr;
   auto byName = [&](const std::string& name) {
@@ -35,7 +35,7 @@ HRESULT Resolve(const QFCFailurePatternPins& pins, const Variant& index, const s
   return pin ? FAULTBOX_OK : E_FAULTBOX_NULL_POINTER;
 }
 
-HRESULT WrapperOf(QFCAbstractFailurePatternPin* pin, std::shared_ptr<QFCBaseFailurePatternPinImpl>& wrapper) {
+[[nodiscard]] HRESULT WrapperOf(QFCAbstractFailurePatternPin* pin, std::shared_ptr<QFCBaseFailurePatternPinImpl>& wrapper) {
   wrapper = pin ? QFCBaseFailurePatternPinImpl::Of(*pin) : nullptr;
   return wrapper ? FAULTBOX_OK : E_FAULTBOX_BOARD_TYPE_IS_NOT_SUPORTED;
 }

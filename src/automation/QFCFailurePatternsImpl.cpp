@@ -15,7 +15,7 @@ namespace {
 constexpr int kTextPatternNameUsed = 6716;
 constexpr int kTextNoPattern = 6717;
 
-HRESULT Resolve(const QFCFailurePatterns& patterns, const Variant& index,
+[[nodiscard]] HRESULT Resolve(const QFCFailurePatterns& patterns, const Variant& index,
                 QFCAbstractFailurePattern*& pattern) {
   pattern = nullptr;
   auto byName = [&](const std::string& name) { return patterns.IndexOf(patterns.FindPattern(name)); };

@@ -3,7 +3,7 @@
 
 #include "automation/QFCOpenDocuments.h"
 #include "automation/QFCSystemsImpl.h"
-#include "host/QFCFaultboxApp.h"
+#include "platform/QFCReporter.h"
 #include "systems/QFCSystem.h"
 
 namespace faultbox {
@@ -16,7 +16,7 @@ QFTScriptHardware& ScriptHardware() {
 }  // namespace
 
 std::shared_ptr<QFCFaultInjectionImpl> QFCFaultInjectionImpl::Create() {
-  if (TheApp().Module() == nullptr) TheApp().StartReporting();
+  if (TheReporter().Module() == nullptr) TheReporter().StartReporting();
   auto documents = std::make_unique<QFCOpenDocuments>();
   return std::shared_ptr<QFCFaultInjectionImpl>(new QFCFaultInjectionImpl(std::move(documents)));
 }

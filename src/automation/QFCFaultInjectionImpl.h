@@ -37,14 +37,14 @@ class QFCFaultInjectionImpl : public QFCOwnerProvider<QFCOpenDocuments> {
   // Discards every document the root opened.
   ~QFCFaultInjectionImpl() override;
 
-  HRESULT get_Name(std::string& name);
-  HRESULT get_Systems(std::shared_ptr<QFCSystemsImpl>& systems);
+  [[nodiscard]] HRESULT get_Name(std::string& name);
+  [[nodiscard]] HRESULT get_Systems(std::shared_ptr<QFCSystemsImpl>& systems);
   // The names of the connected systems.
-  HRESULT get_ConnectedSystem(std::vector<std::string>& names);
+  [[nodiscard]] HRESULT get_ConnectedSystem(std::vector<std::string>& names);
 
   // Extension of the model: the hardware scripts use from now on, as the
   // installed QFTScriptHardware applies it; E_NOTIMPL without one.
-  HRESULT SelectHardware(const std::string& choice);
+  [[nodiscard]] HRESULT SelectHardware(const std::string& choice);
 
   static void SetScriptHardware(QFTScriptHardware hardware);
   static const QFTScriptHardware& GetScriptHardware();

@@ -16,14 +16,14 @@ class QFCEnumVariant : public QFCAutomationObject {
   // Up to `count` elements from the current position into `items` (emptied
   // first); `fetched` is how many. S_OK when all came, S_FALSE when the
   // collection ended first.
-  virtual HRESULT Next(std::uint32_t count, QFTObjectArray& items, std::uint32_t& fetched) = 0;
+  [[nodiscard]] virtual HRESULT Next(std::uint32_t count, QFTObjectArray& items, std::uint32_t& fetched) = 0;
   // Advances by `count`. E_FAULTBOX_INVALID_PARAMETER when that reaches the
   // end of the collection or would pass it; the position never passes the end.
-  virtual HRESULT Skip(std::uint32_t count) = 0;
+  [[nodiscard]] virtual HRESULT Skip(std::uint32_t count) = 0;
   // Back to the first element.
-  virtual HRESULT Reset() = 0;
+  [[nodiscard]] virtual HRESULT Reset() = 0;
   // E_NOTIMPL.
-  virtual HRESULT Clone(std::shared_ptr<QFCEnumVariant>& clone) = 0;
+  [[nodiscard]] virtual HRESULT Clone(std::shared_ptr<QFCEnumVariant>& clone) = 0;
 };
 
 // `Collection` is a collection wrapper with IsAttached, GetKeptText,
@@ -36,7 +36,7 @@ class QFCFaultboxComEnumVariant : public QFCEnumVariant {
 
   bool IsAttached() const override { return collection_ && collection_->IsAttached(); }
 
-  HRESULT Next(std::uint32_t count, QFTObjectArray& items, std::uint32_t& fetched) override {
+  [[nodiscard]] HRESULT Next(std::uint32_t count, QFTObjectArray& items, std::uint32_t& fetched) override {
     QFCAutomationCall frame;
     items.clear();
     fetched = 0;
@@ -50,7 +50,7 @@ class QFCFaultboxComEnumVariant : public QFCEnumVariant {
     return frame.Return(fetched == count ? S_OK : S_FALSE);
   }
 
-  HRESULT Skip(std::uint32_t count) override {
+  [[nodiscard]] HRESULT Skip(std::uint32_t count) override {
     QFCAutomationCall frame;
     if (!IsAttached()) return frame.Detached(collection_->GetKeptText());
     const std::int64_t live = collection_->LiveCount();
@@ -63,14 +63,14 @@ class QFCFaultboxComEnumVariant : public QFCEnumVariant {
     return frame.Return(S_OK);
   }
 
-  HRESULT Reset() override {
+  [[nodiscard]] HRESULT Reset() override {
     QFCAutomationCall frame;
     if (!IsAttached()) return frame.Detached(collection_->GetKeptText());
     position_ = 0;
     return frame.Return(S_OK);
   }
 
-  HRESULT Clone(std::shared_ptr<QFCEnumVariant>& clone) override {
+  [[nodiscard]] HRESULT Clone(std::shared_ptr<QFCEnumVariant>& clone) override {
     QFCAutomationCall frame;
     clone.reset();
     if (!IsAttached()) return frame.Detached(collection_->GetKeptText());

@@ -7,7 +7,7 @@
 #include "automation/QFCAutomationCall.h"
 #include "automation/QFCFaultInjectionImpl.h"
 #include "automation/QFCSystemsImpl.h"
-#include "host/QFCFaultboxApp.h"
+#include "platform/QFCReporter.h"
 #include "platform/FileHelper.h"
 #include "systems/QFCFaultboxDoc.h"
 #include "systems/QFCSystem.h"
@@ -37,7 +37,7 @@ HRESULT QFCOpenDocuments::Open(const std::string& fileName, const std::string& p
   for (const std::string* path : {&fileName, &pinFile}) {
     if (path == &pinFile && pinFile.empty()) continue;
     if (!QFCFileHelper::Exists(*path) || QFCFileHelper::IsDirectory(*path)) {
-      TheApp().ReportError(kMsgFileMissing, *path);
+      TheReporter().ReportError(kMsgFileMissing, *path);
       return RaiseError(E_FAULTBOX_CANN_NOT_OPEN_FILE, AutomationText(kTextCannotOpen, {*path}));
     }
   }
@@ -52,7 +52,7 @@ HRESULT QFCOpenDocuments::Open(const std::string& fileName, const std::string& p
       // the script on a wiring it did not ask for.
       if (!pinFile.empty() &&
           !QFCFileHelper::SameFile(open->GetPinFilePath(), QFCFileHelper::GetAbsolutePath(pinFile, {}))) {
-        TheApp().ReportError(kMsgOpenWithOtherPinFile, open->GetName(), open->GetPinFilePath());
+        TheReporter().ReportError(kMsgOpenWithOtherPinFile, open->GetName(), open->GetPinFilePath());
         return E_FAULTBOX_INVALID_PARAMETER;
       }
       system = open;

@@ -8,7 +8,7 @@
 #include <string>
 #include <vector>
 
-#include "host/ResultCodes.h"
+#include "platform/ResultCodes.h"
 #include "systems/QFCSystemAdmin.h"
 
 namespace faultbox {
@@ -34,14 +34,14 @@ class QFCOpenDocuments {
   // file it names. Both must exist (message 46, E_FAULTBOX_CANN_NOT_OPEN_FILE).
   // A document open already gives its system. A load that fails is
   // E_FAULTBOX_FILE_IS_NOT_OPENED. Failures carry error information.
-  HRESULT Open(const std::string& fileName, const std::string& pinFile, QFCSystem*& system);
+  [[nodiscard]] HRESULT Open(const std::string& fileName, const std::string& pinFile, QFCSystem*& system);
   // Closes through the document: refused (message 85, E_FAULTBOX) while a
   // pattern is activated; E_FAULTBOX for a system of no document here.
-  HRESULT Close(const QFCSystem* system);
+  [[nodiscard]] HRESULT Close(const QFCSystem* system);
   // Closes every document it can; E_FAULTBOX when one stayed.
-  HRESULT CloseAll();
+  [[nodiscard]] HRESULT CloseAll();
   // Saves the system's document atomically where it was loaded from.
-  HRESULT Save(const QFCSystem* system);
+  [[nodiscard]] HRESULT Save(const QFCSystem* system);
 
   QFCFaultboxDoc* FindDocument(const QFCSystem* system) const;
 

@@ -32,7 +32,7 @@ class QFCOwnerProvider : public QFCAutomationObject {
  protected:
   // Runs a member: the call frame, the detached check, then `body(owner)`.
   template <class Body>
-  HRESULT Call(Body&& body) const {
+  [[nodiscard]] HRESULT Call(Body&& body) const {
     QFCAutomationCall frame;
     if (owner_ == nullptr) return frame.Detached(keptText_);
     return frame.Return(std::forward<Body>(body)(*owner_));

@@ -138,7 +138,8 @@ HRESULT QFCSystemImpl::SetInterfaceParameter(std::int32_t deviceType, const Vari
   return Call([&](QFCSystem& system) {
     std::int32_t type = -1;
     std::int32_t values[2] = {-1, -1};
-    system.GetInterfaceParameter(type, values[0], values[1]);
+    if (const HRESULT read = system.GetInterfaceParameter(type, values[0], values[1]); read != FAULTBOX_OK)
+      return read;
     const Variant* given[2] = {&value1, &value2};
     for (int i = 0; i < 2; ++i)
       if (!IsMissing(*given[i]) && !VariantToInt32(*given[i], values[i])) return E_FAULTBOX_INVALID_PARAMETER;

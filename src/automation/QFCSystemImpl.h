@@ -27,31 +27,31 @@ class QFCSystemImpl : public QFCOwnerProvider<QFCSystem> {
   // The documents that hold the system; Close and Save go through them.
   void SetDocuments(QFCOpenDocuments* documents) { documents_ = documents; }
 
-  HRESULT get_Author(std::string& author);
-  HRESULT get_Description(std::string& comment);
-  HRESULT get_PlatformType(std::int32_t& platformType);
-  HRESULT get_Name(std::string& name);
-  HRESULT get_PinFile(std::string& pinFile);
-  HRESULT get_ECUVersion(std::int32_t& ecuVersion);
+  [[nodiscard]] HRESULT get_Author(std::string& author);
+  [[nodiscard]] HRESULT get_Description(std::string& comment);
+  [[nodiscard]] HRESULT get_PlatformType(std::int32_t& platformType);
+  [[nodiscard]] HRESULT get_Name(std::string& name);
+  [[nodiscard]] HRESULT get_PinFile(std::string& pinFile);
+  [[nodiscard]] HRESULT get_ECUVersion(std::int32_t& ecuVersion);
   // Closes the system's document; E_FAULTBOX when nothing was closed.
-  HRESULT Close();
-  HRESULT Connect();
-  HRESULT Disconnect();
-  HRESULT IsConnected(VARIANT_BOOL& isConnected);
-  HRESULT get_FailurePatterns(std::shared_ptr<QFCFailurePatternsImpl>& failurePatterns);
-  HRESULT get_FailureClasses(std::shared_ptr<QFCFailureClassesImpl>& failureClasses);
+  [[nodiscard]] HRESULT Close();
+  [[nodiscard]] HRESULT Connect();
+  [[nodiscard]] HRESULT Disconnect();
+  [[nodiscard]] HRESULT IsConnected(VARIANT_BOOL& isConnected);
+  [[nodiscard]] HRESULT get_FailurePatterns(std::shared_ptr<QFCFailurePatternsImpl>& failurePatterns);
+  [[nodiscard]] HRESULT get_FailureClasses(std::shared_ptr<QFCFailureClassesImpl>& failureClasses);
   // E_FAULTBOX_NOT_CONNECTED_TO_HARDWARE when not connected, else the
   // reset's own result.
-  HRESULT ResetHardware();
+  [[nodiscard]] HRESULT ResetHardware();
   // An omitted value keeps the one set. KR40 family: the port number, 1 to
   // 255; KR60: board and channel, each 0 to 255 (E_FAULTBOX_INVALID_PARAMETER
   // outside, rather than cutting the number short).
-  HRESULT SetInterfaceParameter(std::int32_t deviceType, const Variant& value1 = {},
+  [[nodiscard]] HRESULT SetInterfaceParameter(std::int32_t deviceType, const Variant& value1 = {},
                                 const Variant& value2 = {});
   // All three are -1 unless the settings could be read.
-  HRESULT InterfaceParameter(std::int32_t& deviceType, std::int32_t& value1, std::int32_t& value2);
+  [[nodiscard]] HRESULT InterfaceParameter(std::int32_t& deviceType, std::int32_t& value1, std::int32_t& value2);
   // Extension of the model: saves the system's document atomically in place.
-  HRESULT Save();
+  [[nodiscard]] HRESULT Save();
 
   void Detach() override;
   // The wrapper of one of the system's failure classes, or nullptr.

@@ -20,18 +20,18 @@ class QFCSystemsImpl : public QFCOwnerProvider<QFCOpenDocuments>,
   explicit QFCSystemsImpl(QFCOpenDocuments* owner) : QFCOwnerProvider(owner) {}
 
   // By name (without regard to case) or position; resource strings 6713, 6714.
-  HRESULT Item(const Variant& index, std::shared_ptr<QFCSystemImpl>& system);
-  HRESULT get_Count(std::int32_t& count);
-  HRESULT get_Names(std::vector<std::string>& names);
+  [[nodiscard]] HRESULT Item(const Variant& index, std::shared_ptr<QFCSystemImpl>& system);
+  [[nodiscard]] HRESULT get_Count(std::int32_t& count);
+  [[nodiscard]] HRESULT get_Names(std::vector<std::string>& names);
   // Opens the document `fileName`, with `pinFile` (when not empty) in place
   // of the pin file it names.
-  HRESULT Open(const std::string& fileName, const std::string& pinFile,
+  [[nodiscard]] HRESULT Open(const std::string& fileName, const std::string& pinFile,
                std::shared_ptr<QFCSystemImpl>& system);
-  HRESULT Open(const std::string& fileName, std::shared_ptr<QFCSystemImpl>& system) {
+  [[nodiscard]] HRESULT Open(const std::string& fileName, std::shared_ptr<QFCSystemImpl>& system) {
     return Open(fileName, {}, system);
   }
-  HRESULT CloseAll();
-  HRESULT get__NewEnum(std::shared_ptr<QFCEnumVariant>& newEnum);
+  [[nodiscard]] HRESULT CloseAll();
+  [[nodiscard]] HRESULT get__NewEnum(std::shared_ptr<QFCEnumVariant>& newEnum);
 
   // For the enumerator.
   int LiveCount() const;

@@ -10,7 +10,7 @@
 #include <type_traits>
 #include <vector>
 
-#include "patterns/QFCAbstractMessage.h"
+#include "comm/QFCAbstractMessage.h"
 
 namespace faultbox {
 
@@ -88,9 +88,7 @@ class QFCCANMessage : public QFCAbstractMessage {
   std::int32_t GetStep() const { return step_; }
   void SetStep(std::int32_t step) { step_ = step; }
   std::uint64_t GetData() const { return data_; }
-  void SetData(std::uint64_t data) { data_ = data; }
   std::uint32_t GetIdentifier() const { return identifier_; }
-  void SetIdentifier(std::uint32_t identifier) { identifier_ = identifier; }
   std::uint32_t GetModuleType() const { return moduleType_; }
   void SetModuleType(std::uint32_t type) { moduleType_ = type; }
 

@@ -1,6 +1,7 @@
 // The CAN transfer interface: connecting and disconnecting the channel,
 // sending frames, reading the receive queue and checking the modules' answers.
 #include "comm/QFCCANTransferInterface.h"
+#include "platform/MessageTable.h"
 
 #include <algorithm>
 #include <cinttypes>
@@ -8,10 +9,8 @@
 #include <iterator>
 #include <set>
 
-#include "host/QFCFaultboxApp.h"
-#include "patterns/QFCAbstractFailurePattern.h"
+#include "platform/QFCReporter.h"
 #include "platform/Settings.h"
-#include "systems/QFCSystem.h"
 
 namespace faultbox {
 
@@ -46,7 +45,7 @@ constexpr int kStringChannelDescription = 40026;
 
 // The access layer's own account of a failed operation.
 void ReportLayerFailure(CanResult result) {
-  TheApp().ReportError(kMsgAccessLayer, CanAccess::LastErrorText(), CanResultText(result));
+  TheReporter().ReportError(kMsgAccessLayer, CanAccess::LastErrorText(), CanResultText(result));
 }
 
 std::string Hex(const char* format, std::uint64_t value) {
@@ -57,14 +56,15 @@ std::string Hex(const char* format, std::uint64_t value) {
 
 }  // namespace
 
-QFCCANTransferInterface::QFCCANTransferInterface(QFCSystem* owner) : QFCAbstractTransferInterface(owner) {
+QFCCANTransferInterface::QFCCANTransferInterface(QFITransferOwner* owner) : QFCAbstractTransferInterface(owner) {
   const CanResult result = CanAccess::Create(&instance_);
   instanceCreated_ = result == CanResult::kOk;
-  if (!instanceCreated_) TheApp().ReportError(kMsgLayerNotCreated, std::to_string(static_cast<int>(result)));
+  if (!instanceCreated_) TheReporter().ReportError(kMsgLayerNotCreated, std::to_string(static_cast<int>(result)));
 }
 
 QFCCANTransferInterface::~QFCCANTransferInterface() {
-  if (connected_) Connect(false, 0, 0);
+  // A destructor cannot pass a failure on; disconnecting reports its own.
+  if (connected_) (void)Connect(false, 0, 0);
   if (instanceCreated_) CanAccess::Release(instance_);
 }
 
@@ -80,12 +80,12 @@ std::string QFCCANTransferInterface::GetReceiveEventName() const {
 }
 
 QFTCANInterfaceSettings QFCCANTransferInterface::ConfiguredChannel() const {
-  const QFCSystem* system = GetOwnerSystem();
+  const QFITransferOwner* system = GetOwnerSystem();
   return system ? system->GetCANSettings() : QFTCANInterfaceSettings{};
 }
 
 std::string QFCCANTransferInterface::OwnerName() const {
-  const QFCSystem* system = GetOwnerSystem();
+  const QFITransferOwner* system = GetOwnerSystem();
   return system ? system->GetName() : std::string();
 }
 
@@ -104,18 +104,18 @@ HRESULT QFCCANTransferInterface::Connect(bool connect, std::int32_t acceptanceCo
   receiveEvent_ = NamedEvent::CreateFirstFree(kCanReceiveEventFormat);
   if (!receiveEvent_ || !SetUpChannel()) {
     ReleaseChannel();
-    TheApp().ReportError(kMsgChannelNotSetUp);
+    TheReporter().ReportError(kMsgChannelNotSetUp);
     return E_FAIL;
   }
   if (const CanResult result = CanAccess::ActivateChannel(channel_); result != CanResult::kOk) {
     ReportLayerFailure(result);
-    TheApp().ReportError(kMsgChannelNotOpened);
+    TheReporter().ReportError(kMsgChannelNotOpened);
     ReleaseChannel();
-    TheApp().ReportError(kMsgChannelNotSetUp);
+    TheReporter().ReportError(kMsgChannelNotSetUp);
     return E_FAIL;
   }
   connected_ = true;
-  TheApp().ReportInfo(kMsgConnected);
+  TheReporter().ReportInfo(kMsgConnected);
   return FAULTBOX_OK;
 }
 
@@ -123,14 +123,14 @@ bool QFCCANTransferInterface::FindConfiguredChannel(const QFTCANInterfaceSetting
   std::vector<QFTCANInterfaceSettings> available;
   std::uint32_t count = 0;
   if (GetAvailableChannels(available, count) != FAULTBOX_OK || count == 0) {
-    TheApp().ReportError(kMsgChannelNotOpened);
+    TheReporter().ReportError(kMsgChannelNotOpened);
     return false;
   }
   for (const QFTCANInterfaceSettings& channel : available) {
     if (channel.deviceType != configured.deviceType || channel.firstParameter != configured.firstParameter ||
         channel.secondParameter != configured.secondParameter)
       continue;
-    QFCSystem* system = GetOwnerSystem();
+    QFITransferOwner* system = GetOwnerSystem();
     QFTCANInterfaceSettings updated = configured;
     std::copy(std::begin(channel.furtherValues), std::end(channel.furtherValues), updated.furtherValues);
     // The values are only carried along; a write-protected document keeps
@@ -152,7 +152,7 @@ bool QFCCANTransferInterface::SetUpChannel() {
                                                   configured.secondParameter, &channel_);
   if (result != CanResult::kOk) {
     ReportLayerFailure(result);
-    TheApp().ReportError(kMsgChannelNotOpened);
+    TheReporter().ReportError(kMsgChannelNotOpened);
     return false;
   }
   registered_ = true;
@@ -163,25 +163,25 @@ bool QFCCANTransferInterface::SetUpChannel() {
     return false;
   }
   if (initAccess_ == 1) {
-    std::uint32_t busTiming0 = QFCSystemProperty::kDefaultBusTiming0;
-    std::uint32_t busTiming1 = QFCSystemProperty::kDefaultBusTiming1;
-    if (const QFCSystem* system = GetOwnerSystem()) system->GetBusTiming(busTiming0, busTiming1);
+    std::uint32_t busTiming0 = kDefaultCanBusTiming0;
+    std::uint32_t busTiming1 = kDefaultCanBusTiming1;
+    if (const QFITransferOwner* system = GetOwnerSystem()) system->GetBusTiming(busTiming0, busTiming1);
     if ((result = CanAccess::SetBusTimingRegister(channel_, busTiming0, busTiming1)) != CanResult::kOk) {
       ReportLayerFailure(result);
-      TheApp().ReportError(kMsgBusTimingNotSet, OwnerName());
+      TheReporter().ReportError(kMsgBusTimingNotSet, OwnerName());
       return false;
     }
   } else {
     // Someone else set the bus up: it is used as it is, but only at the
     // modules' bit rate.
-    TheApp().ReportWarning(kMsgInitialisedElsewhere, OwnerName());
+    TheReporter().ReportWarning(kMsgInitialisedElsewhere, OwnerName());
     CanBaudrateInfo info;
     if ((result = CanAccess::GetCurrentBaudrate(channel_, &info)) != CanResult::kOk) {
       ReportLayerFailure(result);
       return false;
     }
     if (info.bitRate != kRequiredBitRate) {
-      TheApp().ReportError(kMsgWrongBitRate, std::to_string(info.bitRate));
+      TheReporter().ReportError(kMsgWrongBitRate, std::to_string(info.bitRate));
       return false;
     }
   }
@@ -191,7 +191,7 @@ bool QFCCANTransferInterface::SetUpChannel() {
     ReportLayerFailure(result);
     return false;
   }
-  channelDescription_ = QFCAbstractFailurePattern::ResourceText(
+  channelDescription_ = ResourceText(
       kStringChannelDescription,
       {GetDeviceTypeName(configured.deviceType), std::to_string(configured.firstParameter),
        std::to_string(configured.secondParameter)});
@@ -211,7 +211,7 @@ HRESULT QFCCANTransferInterface::Disconnect() {
   HRESULT outcome = FAULTBOX_OK;
   if (const CanResult result = CanAccess::DeactivateChannel(channel_); result != CanResult::kOk) {
     ReportLayerFailure(result);
-    TheApp().ReportError(kMsgChannelNotOpened);
+    TheReporter().ReportError(kMsgChannelNotOpened);
     outcome = E_FAIL;
   }
   // Released even when it could not be deactivated: a channel kept
@@ -221,10 +221,10 @@ HRESULT QFCCANTransferInterface::Disconnect() {
   channel_ = 0;
   if (result != CanResult::kOk) {
     ReportLayerFailure(result);
-    TheApp().ReportError(kMsgNotReleased);
+    TheReporter().ReportError(kMsgNotReleased);
     return E_FAIL;
   }
-  if (outcome == FAULTBOX_OK) TheApp().ReportInfo(kMsgDisconnected);
+  if (outcome == FAULTBOX_OK) TheReporter().ReportInfo(kMsgDisconnected);
   return outcome;
 }
 
@@ -262,11 +262,11 @@ void QFCCANTransferInterface::FlushReceiveQueue() {
 HRESULT QFCCANTransferInterface::SendMessage(const QFCCANMessage* message, std::int32_t errorContext,
                                              bool flushFirst) {
   if (message == nullptr) {
-    TheApp().ReportInternalFault(errorContext != 0 ? errorContext : kPlaceNoMessage);
+    TheReporter().ReportInternalFault(errorContext != 0 ? errorContext : kPlaceNoMessage);
     return E_FAULTBOX_NULL_POINTER;
   }
   if (!connected_) {
-    TheApp().ReportError(kMsgNotConnected);
+    TheReporter().ReportError(kMsgNotConnected);
     return E_FAULTBOX_NOT_CONNECTED_TO_HARDWARE;
   }
   if (flushFirst) FlushReceiveQueue();
@@ -291,7 +291,7 @@ HRESULT QFCCANTransferInterface::SendMessage(const QFCCANMessage* message, std::
 HRESULT QFCCANTransferInterface::Receive(QFCCANReceivedMap& received) {
   received.clear();
   if (!receiveEvent_ || !registered_) {
-    TheApp().ReportInternalFault(kPlaceNoEvent);
+    TheReporter().ReportInternalFault(kPlaceNoEvent);
     return E_FAIL;
   }
   if (receiveEvent_->Wait(kPassDuration) == NamedEvent::WaitResult::kTimedOut) return E_FAULTBOX_TIME_OUT;
@@ -304,12 +304,12 @@ HRESULT QFCCANTransferInterface::Receive(QFCCANReceivedMap& received) {
   if (const CanResult result = CanAccess::ReadReceiveQueue(channel_, frames_.data(), &count);
       result != CanResult::kOk) {
     ReportLayerFailure(result);
-    TheApp().ReportInternalFault(kPlaceReadQueue);
+    TheReporter().ReportInternalFault(kPlaceReadQueue);
     return E_FAIL;
   }
   // More may wait in the queue: the next read must not wait for a new frame.
   if (count == kReceiveRoom) receiveEvent_->Set();
-  if (count == 0) TheApp().ReportInternal(kMsgQueueEmpty);
+  if (count == 0) TheReporter().ReportInternal(kMsgQueueEmpty);
 
   int data = 0, error = 0, busStatus = 0, remote = 0, unknown = 0;
   for (std::uint32_t i = 0; i < count; ++i) {
@@ -340,7 +340,7 @@ HRESULT QFCCANTransferInterface::Receive(QFCCANReceivedMap& received) {
         "Received Messages: %i (Data msg: %i, Error msg: %i, BUS status Msg: %i, Remote msg: %i, Unknow "
         "msg: %i)",
         static_cast<int>(count), data, error, busStatus, remote, unknown);
-    TheApp().ReportInternal(kMsgReceived, text);
+    TheReporter().ReportInternal(kMsgReceived, text);
   }
   return FAULTBOX_OK;
 }
@@ -350,7 +350,7 @@ HRESULT QFCCANTransferInterface::Receive(QFCCANReceivedMap& received) {
 HRESULT QFCCANTransferInterface::EvaluateAnswer(const QFCCANMessage& answer,
                                                 const QFCCANMessage& expected) const {
   if (answer.GetIdentifier() != expected.GetAnswerIdentifier()) {
-    TheApp().ReportInternalFault(kPlaceWrongAnswer);
+    TheReporter().ReportInternalFault(kPlaceWrongAnswer);
     return E_FAULTBOX_RECEIVE_MESSAGE;
   }
   const std::uint64_t masked = answer.GetData() & QFCCANMessage::kAnswerMask;
@@ -358,25 +358,25 @@ HRESULT QFCCANTransferInterface::EvaluateAnswer(const QFCCANMessage& answer,
     case QFCCANMessage::AnswerStatus::kAccepted:
       return FAULTBOX_OK;
     case QFCCANMessage::AnswerStatus::kRefused:
-      TheApp().ReportError(kMsgAnswerRefused, Hex("0x%" PRIx64, answer.GetModuleAddress()),
+      TheReporter().ReportError(kMsgAnswerRefused, Hex("0x%" PRIx64, answer.GetModuleAddress()),
                            Hex("0x%" PRIx64, masked));
       return E_FAIL;
     case QFCCANMessage::AnswerStatus::kInvalid:
       break;
   }
-  TheApp().ReportError(kMsgAnswerInvalid, Hex("0x%" PRIx64, answer.GetModuleAddress()),
+  TheReporter().ReportError(kMsgAnswerInvalid, Hex("0x%" PRIx64, answer.GetModuleAddress()),
                        Hex("0x%" PRIx64, masked));
   return E_FAULTBOX_RECEIVE_MESSAGE;
 }
 
 HRESULT QFCCANTransferInterface::WaitForAnswers(const QFCCANExpectedMap& expected) {
   if (expected.empty()) {
-    TheApp().ReportInternal(kMsgNothingSent);
+    TheReporter().ReportInternal(kMsgNothingSent);
     return E_FAULTBOX_MSG_WAS_NOT_TRANSMITED;
   }
   for (const auto& entry : expected) {
     if (entry.second == nullptr) {
-      TheApp().ReportInternalFault(kPlaceNoExpected);
+      TheReporter().ReportInternalFault(kPlaceNoExpected);
       return E_FAULTBOX_EVALUATE_MESSAGE;
     }
   }
@@ -406,7 +406,7 @@ HRESULT QFCCANTransferInterface::WaitForAnswers(const QFCCANExpectedMap& expecte
   }
   if (lastPassTimedOut) return E_FAULTBOX_TIME_OUT;
   for (std::uint32_t request : unanswered)
-    TheApp().ReportError(kMsgNoAnswer, Hex("%" PRIX64, expected.at(request)->GetModuleAddress()));
+    TheReporter().ReportError(kMsgNoAnswer, Hex("%" PRIX64, expected.at(request)->GetModuleAddress()));
   return E_FAULTBOX_TRANSMITED_MSG_WAS_NOT_RESPONDING;
 }
 

@@ -13,7 +13,7 @@
 #include "comm/QFCAbstractTransferInterface.h"
 #include "comm/QFCCANMessage.h"
 #include "platform/CanAccess.h"
-#include "systems/QFCSystemProperty.h"
+#include "platform/InterfaceSettings.h"
 
 namespace faultbox {
 
@@ -40,7 +40,7 @@ class QFCCANTransferInterface : public QFCAbstractTransferInterface {
 
   // Creates the access layer instance; a failure is reported (message 133)
   // and leaves an interface that never connects.
-  explicit QFCCANTransferInterface(QFCSystem* owner = nullptr);
+  explicit QFCCANTransferInterface(QFITransferOwner* owner = nullptr);
   // Disconnects first when connected.
   ~QFCCANTransferInterface() override;
 
@@ -57,7 +57,7 @@ class QFCCANTransferInterface : public QFCAbstractTransferInterface {
   // 103); a channel that cannot be deactivated is released all the same
   // (message 58, E_FAIL), one that cannot be released gives message 55 and
   // E_FAIL. Either way the interface is disconnected afterwards.
-  HRESULT Connect(bool connect, std::int32_t acceptanceCode, std::int32_t acceptanceMask) override;
+  [[nodiscard]] HRESULT Connect(bool connect, std::int32_t acceptanceCode, std::int32_t acceptanceMask) override;
   // Drops the frames received so far (and the signal they left).
   void FlushReceiveQueue() override;
 
@@ -68,7 +68,7 @@ class QFCCANTransferInterface : public QFCAbstractTransferInterface {
   // without a message; E_FAULTBOX_NOT_CONNECTED_TO_HARDWARE (message 54) when
   // not connected; E_FAULTBOX_MSG_WAS_NOT_TRANSMITED when the access layer
   // refuses the frame (its reason is reported with message 190).
-  HRESULT SendMessage(const QFCCANMessage* message, std::int32_t errorContext = 0, bool flushFirst = false);
+  [[nodiscard]] HRESULT SendMessage(const QFCCANMessage* message, std::int32_t errorContext = 0, bool flushFirst = false);
 
   // Waits up to kPassDuration for frames, then moves every frame the receive
   // queue holds (at most kReceiveRoom) into `received`, which is emptied
@@ -77,7 +77,7 @@ class QFCCANTransferInterface : public QFCAbstractTransferInterface {
   // E_FAULTBOX_TIME_OUT when nothing arrived, E_FAIL when the queue cannot be
   // read or the interface is not connected. With the setting "Info" = "1" at
   // connecting, every read is summed up in message 81.
-  HRESULT Receive(QFCCANReceivedMap& received);
+  [[nodiscard]] HRESULT Receive(QFCCANReceivedMap& received);
 
   // Waits until every message of `expected` is answered by its module (the
   // request identifier with direction 01), up to "Timeout" passes of
@@ -89,12 +89,12 @@ class QFCCANTransferInterface : public QFCAbstractTransferInterface {
   // every module still silent and E_FAULTBOX_TRANSMITED_MSG_WAS_NOT_RESPONDING.
   // An empty map is message 65 and E_FAULTBOX_MSG_WAS_NOT_TRANSMITED, a null
   // message in it E_FAULTBOX_EVALUATE_MESSAGE.
-  HRESULT WaitForAnswers(const QFCCANExpectedMap& expected);
+  [[nodiscard]] HRESULT WaitForAnswers(const QFCCANExpectedMap& expected);
 
   // The channel descriptions of every channel the access layer can open now,
   // in its order; `count` is their number. E_FAIL (both empty) when the layer
   // cannot list them.
-  HRESULT GetAvailableChannels(std::vector<QFTCANInterfaceSettings>& channels, std::uint32_t& count);
+  [[nodiscard]] HRESULT GetAvailableChannels(std::vector<QFTCANInterfaceSettings>& channels, std::uint32_t& count);
 
   // "Vector CANCardX" and the other names of the device types 0 to 5.
   static std::string GetDeviceTypeName(std::uint32_t deviceType);
@@ -111,10 +111,10 @@ class QFCCANTransferInterface : public QFCAbstractTransferInterface {
   // Finds the configured channel among the available ones and copies their
   // further values into the system's settings. False when none is available.
   bool FindConfiguredChannel(const QFTCANInterfaceSettings& configured);
-  HRESULT Disconnect();
+  [[nodiscard]] HRESULT Disconnect();
   // Unregisters the channel (if registered) and drops the receive event.
   void ReleaseChannel();
-  HRESULT EvaluateAnswer(const QFCCANMessage& answer, const QFCCANMessage& expected) const;
+  [[nodiscard]] HRESULT EvaluateAnswer(const QFCCANMessage& answer, const QFCCANMessage& expected) const;
   // The settings the channel is opened with.
   QFTCANInterfaceSettings ConfiguredChannel() const;
   std::string OwnerName() const;

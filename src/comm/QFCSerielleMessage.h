@@ -10,7 +10,7 @@
 #include <utility>
 #include <vector>
 
-#include "patterns/QFCAbstractMessage.h"
+#include "comm/QFCAbstractMessage.h"
 
 namespace faultbox {
 
@@ -36,14 +36,10 @@ class QFCSerielleMessage : public QFCAbstractMessage {
         value_(value) {}
 
   std::int32_t GetKind() const { return kind_; }
-  void SetKind(std::int32_t kind) { kind_ = kind; }
   std::uint32_t GetModuleAddress() const { return moduleAddress_; }
-  void SetModuleAddress(std::uint32_t address) { moduleAddress_ = address; }
   // The second byte of a protocol A module selection.
   bool IsAddressByte() const { return addressByte_; }
-  void SetAddressByte(bool addressByte) { addressByte_ = addressByte; }
   bool IsAnswerExpected() const { return answerExpected_; }
-  void SetAnswerExpected(bool expected) { answerExpected_ = expected; }
   // Either flag means the module answers after this byte.
   bool ExpectsAnswer() const { return answerExpected_ || addressByte_; }
   std::uint32_t GetValue() const { return value_; }

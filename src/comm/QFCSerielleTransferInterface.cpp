@@ -4,8 +4,7 @@
 
 #include <array>
 
-#include "host/QFCFaultboxApp.h"
-#include "systems/QFCSystem.h"
+#include "platform/QFCReporter.h"
 
 namespace faultbox {
 
@@ -32,20 +31,21 @@ using Clock = std::chrono::steady_clock;
 
 }  // namespace
 
-QFCSerielleTransferInterface::QFCSerielleTransferInterface(QFCSystem* owner)
+QFCSerielleTransferInterface::QFCSerielleTransferInterface(QFITransferOwner* owner)
     : QFCAbstractTransferInterface(owner) {}
 
 QFCSerielleTransferInterface::~QFCSerielleTransferInterface() {
-  if (connected_) Connect(false, 0, 0);
+  // A destructor cannot pass a failure on; disconnecting reports its own.
+  if (connected_) (void)Connect(false, 0, 0);
 }
 
 std::string QFCSerielleTransferInterface::GetPortName() const {
-  const QFCSystem* system = GetOwnerSystem();
+  const QFITransferOwner* system = GetOwnerSystem();
   return system ? system->GetSerialSettings().portName : std::string();
 }
 
 void QFCSerielleTransferInterface::ReportPortFault(int place) const {
-  TheApp().ReportInternal(QFCFaultboxApp::kInternalFault, std::to_string(place), port_.DescribeLastError());
+  TheReporter().ReportInternal(QFCReporter::kInternalFault, std::to_string(place), port_.DescribeLastError());
 }
 
 HRESULT QFCSerielleTransferInterface::Connect(bool connect, std::int32_t, std::int32_t) {
@@ -53,7 +53,7 @@ HRESULT QFCSerielleTransferInterface::Connect(bool connect, std::int32_t, std::i
     if (!connected_ && !port_.IsOpen()) return FAULTBOX_OK;
     port_.Close();
     connected_ = false;
-    TheApp().ReportInfo(kMsgDisconnected);
+    TheReporter().ReportInfo(kMsgDisconnected);
     return FAULTBOX_OK;
   }
   if (connected_) return FAULTBOX_OK;
@@ -62,21 +62,21 @@ HRESULT QFCSerielleTransferInterface::Connect(bool connect, std::int32_t, std::i
   switch (port_.Open(portName)) {
     case SerialPort::Status::kOk:
       connected_ = true;
-      TheApp().ReportInfo(kMsgConnected);
+      TheReporter().ReportInfo(kMsgConnected);
       return FAULTBOX_OK;
     case SerialPort::Status::kNoDevice:
     case SerialPort::Status::kOpenFailed:
     case SerialPort::Status::kBusy:
     case SerialPort::Status::kNotATerminal:
-      TheApp().ReportError(kMsgCannotOpen, portName, port_.DescribeLastError());
+      TheReporter().ReportError(kMsgCannotOpen, portName, port_.DescribeLastError());
       return E_FAULTBOX_CONNECT;
     case SerialPort::Status::kSettingsFailed:
-      TheApp().ReportError(kMsgSettingsFailed, port_.DescribeLastError());
+      TheReporter().ReportError(kMsgSettingsFailed, port_.DescribeLastError());
       [[fallthrough]];
     default:
       // The port was closed again by the failed open.
       ReportPortFault(kPlaceSetup);
-      TheApp().ReportError(kMsgSetupFailed, portName);
+      TheReporter().ReportError(kMsgSetupFailed, portName);
       return E_FAULTBOX_CONNECT;
   }
 }
@@ -87,11 +87,11 @@ void QFCSerielleTransferInterface::FlushReceiveQueue() {
 
 HRESULT QFCSerielleTransferInterface::SendByte(const QFCSerielleMessage* message) {
   if (message == nullptr) {
-    TheApp().ReportInternalFault(kPlaceNoMessage);
+    TheReporter().ReportInternalFault(kPlaceNoMessage);
     return E_FAULTBOX_NULL_POINTER;
   }
   if (!port_.IsOpen()) {
-    TheApp().ReportError(kMsgNotConnected);
+    TheReporter().ReportError(kMsgNotConnected);
     return E_FAULTBOX_NOT_CONNECTED_TO_HARDWARE;
   }
   // Every write waits until its byte is out, so no earlier byte is left to
@@ -128,13 +128,13 @@ HRESULT QFCSerielleTransferInterface::ReadBytes(QFCSerielleReceivedMap& received
 
 HRESULT QFCSerielleTransferInterface::WaitForAnswers(const QFCSerielleMessageMap& sent) {
   if (sent.empty()) {
-    TheApp().ReportInternal(kMsgNothingSent);
+    TheReporter().ReportInternal(kMsgNothingSent);
     return E_FAULTBOX_MSG_WAS_NOT_TRANSMITED;
   }
   std::uint8_t expected = 0;
   for (const auto& [index, message] : sent) {
     if (message == nullptr) {
-      TheApp().ReportInternalFault(kPlaceNoSentMessage);
+      TheReporter().ReportInternalFault(kPlaceNoSentMessage);
       return E_FAULTBOX_NULL_POINTER;
     }
     expected = static_cast<std::uint8_t>(expected + message->GetByte());
@@ -157,7 +157,7 @@ HRESULT QFCSerielleTransferInterface::WaitForAnswers(const QFCSerielleMessageMap
     const HRESULT result = ReadBytes(received);
     if (result == E_FAULTBOX_TIME_OUT) continue;
     if (result != FAULTBOX_OK) {
-      TheApp().ReportInternalFault(kPlaceWaitRead);
+      TheReporter().ReportInternalFault(kPlaceWaitRead);
       return result;
     }
     bytesCame = true;

@@ -27,7 +27,7 @@ class QFCSerielleTransferInterface : public QFCAbstractTransferInterface {
   // ListPorts tries COM0 to COM99.
   static constexpr int kListedPorts = 100;
 
-  explicit QFCSerielleTransferInterface(QFCSystem* owner = nullptr);
+  explicit QFCSerielleTransferInterface(QFITransferOwner* owner = nullptr);
   // Disconnects first when connected.
   ~QFCSerielleTransferInterface() override;
 
@@ -36,7 +36,7 @@ class QFCSerielleTransferInterface : public QFCAbstractTransferInterface {
   // reports message 62 on success. Disconnecting closes it and reports
   // message 103. Connecting a connected interface and disconnecting one that
   // is not connected do nothing. The two parameters are not used.
-  HRESULT Connect(bool connect, std::int32_t first, std::int32_t second) override;
+  [[nodiscard]] HRESULT Connect(bool connect, std::int32_t first, std::int32_t second) override;
   // Drops the bytes the port holds that nobody has asked for.
   void FlushReceiveQueue() override;
 
@@ -44,11 +44,11 @@ class QFCSerielleTransferInterface : public QFCAbstractTransferInterface {
   // E_FAULTBOX_NOT_CONNECTED_TO_HARDWARE (message 54) when the port is not
   // open, E_FAULTBOX_MSG_WAS_NOT_TRANSMITED when the write fails,
   // E_FAULTBOX_NULL_POINTER without a message.
-  HRESULT SendByte(const QFCSerielleMessage* message);
+  [[nodiscard]] HRESULT SendByte(const QFCSerielleMessage* message);
   // Moves the bytes the port holds (at most kReadLimit) into `received`,
   // which is emptied first, under their positions 0, 1, 2, ...
   // E_FAULTBOX_TIME_OUT when the port holds none.
-  HRESULT ReadBytes(QFCSerielleReceivedMap& received);
+  [[nodiscard]] HRESULT ReadBytes(QFCSerielleReceivedMap& received);
   // Waits for the answer to the sent bytes: their sum modulo 256. Up to
   // "Timeout" passes of kPassDuration each (see GetAnswerTimeout); the wait
   // ends as soon as a byte read equals the answer. FAULTBOX_OK when it came;
@@ -56,7 +56,7 @@ class QFCSerielleTransferInterface : public QFCAbstractTransferInterface {
   // answer, and at once without reading when "Timeout" is below 1;
   // E_FAULTBOX_TIME_OUT when nothing came. An empty map is message 65 and
   // E_FAULTBOX_MSG_WAS_NOT_TRANSMITED.
-  HRESULT WaitForAnswers(const QFCSerielleMessageMap& sent);
+  [[nodiscard]] HRESULT WaitForAnswers(const QFCSerielleMessageMap& sent);
 
   // The numbers n of the ports "COMn", n from 0 to 99, that can be opened now.
   static void ListPorts(std::vector<std::int32_t>& numbers);

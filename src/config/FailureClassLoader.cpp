@@ -6,7 +6,7 @@
 
 #include <cstdlib>
 
-#include "host/QFCFaultboxApp.h"
+#include "platform/QFCReporter.h"
 #include "platform/Archive.h"
 #include "platform/AtomicFile.h"
 #include "platform/FileHelper.h"
@@ -67,9 +67,9 @@ std::vector<std::uint8_t> StoreFailureClasses(QFCAbstractFailureClasses& classes
   return ar.Data();
 }
 
-HRESULT LoadFailureClasses(const std::string& fileName, std::int32_t platform, const std::string& boardType,
+[[nodiscard]] HRESULT LoadFailureClasses(const std::string& fileName, std::int32_t platform, const std::string& boardType,
                            std::unique_ptr<QFCAbstractFailureClasses>* out, std::string* pathUsed) {
-  QFCFaultboxApp& app = TheApp();
+  QFCReporter& app = TheReporter();
   if (out) out->reset();
 
   std::string path = fileName;

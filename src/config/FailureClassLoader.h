@@ -8,7 +8,7 @@
 #include <vector>
 
 #include "config/QFCAbstractFailureClasses.h"
-#include "host/ResultCodes.h"
+#include "platform/ResultCodes.h"
 
 namespace faultbox {
 
@@ -35,7 +35,7 @@ std::string DefaultFailureClassFile(std::int32_t platform, const std::string& bo
 // was read completely and is of the system's platform.
 // `platform` 0 takes the platform the file names, which must be 1 or 2 (for
 // tools that show a file without a system); "none" then needs a real platform.
-HRESULT LoadFailureClasses(const std::string& fileName, std::int32_t platform, const std::string& boardType,
+[[nodiscard]] HRESULT LoadFailureClasses(const std::string& fileName, std::int32_t platform, const std::string& boardType,
                            std::unique_ptr<QFCAbstractFailureClasses>* out, std::string* pathUsed = nullptr);
 
 // Reads a collection from the bytes of a failure class file; throws

@@ -14,7 +14,7 @@
 #include <vector>
 
 #include "config/QFCAbstractFailureClass.h"
-#include "host/QFCFaultboxApp.h"
+#include "platform/QFCReporter.h"
 
 namespace faultbox {
 namespace {
@@ -226,9 +226,9 @@ class SourceReader {
   void Refuse(const std::string& where, const std::string& what) {
     ++errors_;
     if (errors_ <= kMaxReports) {
-      TheApp().ReportError(kMsgFailureClassSourceValue, where, what);
+      TheReporter().ReportError(kMsgFailureClassSourceValue, where, what);
     } else if (errors_ == kMaxReports + 1) {
-      TheApp().ReportError(kMsgFailureClassSourceValue, source_, "further problems are not reported");
+      TheReporter().ReportError(kMsgFailureClassSourceValue, source_, "further problems are not reported");
     }
   }
 
@@ -584,7 +584,7 @@ void Pretty(const OrderedJson& j, int indent, std::string& out) {
 
 }  // namespace
 
-HRESULT ParseFailureClassSource(std::string_view text, const std::string& sourceName,
+[[nodiscard]] HRESULT ParseFailureClassSource(std::string_view text, const std::string& sourceName,
                                 std::unique_ptr<QFCAbstractFailureClasses>* out) {
   if (out) out->reset();
   Json root;
@@ -596,7 +596,7 @@ HRESULT ParseFailureClassSource(std::string_view text, const std::string& source
     std::string why = e.what();
     const std::size_t close = why.find("] ");
     if (close != std::string::npos) why = why.substr(close + 2);
-    TheApp().ReportError(kMsgFailureClassSourceSyntax, sourceName, why);
+    TheReporter().ReportError(kMsgFailureClassSourceSyntax, sourceName, why);
     return E_FAULTBOX_CONSISTENCY_CHECK;
   }
   SourceReader reader(sourceName);

@@ -9,7 +9,7 @@
 #include <string_view>
 
 #include "config/QFCAbstractFailureClasses.h"
-#include "host/ResultCodes.h"
+#include "platform/ResultCodes.h"
 
 namespace faultbox {
 
@@ -29,7 +29,7 @@ constexpr std::uint32_t kMaxSourceStep = 0x7FFFFFFF;
 // (message 911, up to a bounded number of reports); any refusal, or text that
 // is not JSON (message 910), gives E_FAULTBOX_CONSISTENCY_CHECK and no
 // collection. `sourceName` names the source in the messages.
-HRESULT ParseFailureClassSource(std::string_view text, const std::string& sourceName,
+[[nodiscard]] HRESULT ParseFailureClassSource(std::string_view text, const std::string& sourceName,
                                 std::unique_ptr<QFCAbstractFailureClasses>* out);
 
 // The source text of a collection. Parsing it gives an equal collection back

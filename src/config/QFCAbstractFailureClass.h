@@ -41,8 +41,6 @@ class QFTPossibility {
   void Set(std::size_t position, std::uint32_t state, std::uint32_t first, std::uint32_t second);
 
   const std::vector<std::uint32_t>& RelayStates() const { return relayStates_; }
-  const std::vector<std::uint32_t>& FirstNumbers() const { return firstNumbers_; }
-  const std::vector<std::uint32_t>& SecondNumbers() const { return secondNumbers_; }
 
   // Bit j set when position j is on; positions from 64 on have no bit.
   std::uint64_t RelayMask() const;

@@ -4,8 +4,8 @@
 
 #include <algorithm>
 
-#include "config/QFCKR40FailureClasses.h"
-#include "config/QFCKR60FailureClasses.h"
+#include "config/kr40/QFCKR40FailureClasses.h"
+#include "config/kr60/QFCKR60FailureClasses.h"
 #include "platform/Archive.h"
 
 namespace faultbox {

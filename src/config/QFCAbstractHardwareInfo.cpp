@@ -6,7 +6,7 @@
 #include <new>
 
 #include "config/QFCFSHelper.h"
-#include "host/QFCFaultboxApp.h"
+#include "platform/QFCReporter.h"
 #include "platform/FileHelper.h"
 
 namespace faultbox {
@@ -78,13 +78,13 @@ HRESULT QFCAbstractHardwareInfo::CheckMandatoryColumns() {
 
 HRESULT QFCAbstractHardwareInfo::CheckCommonColumns() {
   if (columns_.empty()) {
-    TheApp().ReportInternalFault(48);
+    TheReporter().ReportInternalFault(48);
     return E_FAULTBOX_CONSISTENCY_CHECK;
   }
   for (const char* pattern : {"pin_name(%i)", "ecu_name(%i)", "faults_ecu(%i)"}) {
     const std::string column = QFCFSHelper::ToLower(FormatNumbered(pattern, ecuVersion_));
     if (std::find(columns_.begin(), columns_.end(), column) == columns_.end()) {
-      TheApp().ReportError(39, column, fileName_);
+      TheReporter().ReportError(39, column, fileName_);
       return E_FAULTBOX_HEADER_COL_NOT_FOUND;
     }
   }
@@ -94,13 +94,13 @@ HRESULT QFCAbstractHardwareInfo::CheckCommonColumns() {
 bool QFCAbstractHardwareInfo::RequireKey(std::string_view key) const {
   std::string value;
   if (GetFormatValue(key, value) == FAULTBOX_OK) return true;
-  TheApp().ReportError(50, std::string(key), fileName_);
+  TheReporter().ReportError(50, std::string(key), fileName_);
   return false;
 }
 
 HRESULT QFCAbstractHardwareInfo::GetFormatValue(std::string_view key, std::string& value) const {
   if (!format_) {
-    TheApp().ReportInternalFault(51);
+    TheReporter().ReportInternalFault(51);
     return E_FAULTBOX_CONSISTENCY_CHECK;
   }
   auto it = format_->find(QFCFSHelper::ToLower(key));
@@ -114,7 +114,7 @@ std::int32_t QFCAbstractHardwareInfo::GetPlatformFromBoardType() const {
   if (GetFormatValue("BoardType", board) != FAULTBOX_OK) board.clear();
   if (IsKR40Board(board)) return fptKR40Platform;
   if (IsKR60Board(board)) return fptKR60Platform;
-  TheApp().ReportWarning(49, board);
+  TheReporter().ReportWarning(49, board);
   return 0;
 }
 
@@ -125,7 +125,7 @@ std::int32_t QFCAbstractHardwareInfo::PinPlatform() const {
 
 HRESULT QFCAbstractHardwareInfo::GetPotential(int index, std::string& name) const {
   if (index < 0 || index >= 5) {
-    TheApp().ReportInternalFault(54);
+    TheReporter().ReportInternalFault(54);
     return E_FAULTBOX_INVALID_PARAMETER;
   }
   return GetFormatValue(FormatNumbered("Potential%i", index), name);
@@ -165,19 +165,19 @@ std::size_t QFCAbstractHardwareInfo::GetPinCount() const {
 
 std::int32_t QFCAbstractHardwareInfo::FindOrReport(std::string_view tag, std::int32_t start) {
   const std::int32_t position = parser_.FindTag(tag, start);
-  if (position < 0) TheApp().ReportError(47, std::string(tag), parser_.GetTitle());
+  if (position < 0) TheReporter().ReportError(47, std::string(tag), parser_.GetTitle());
   return position;
 }
 
 HRESULT QFCAbstractHardwareInfo::OpenPinFile(int placeCannotOpen, int placeNotOpened) {
   if (!parser_.Open(pinFilePath_)) {
-    TheApp().ReportError(46, pinFilePath_);
-    TheApp().ReportInternalFault(placeCannotOpen);
+    TheReporter().ReportError(46, pinFilePath_);
+    TheReporter().ReportInternalFault(placeCannotOpen);
     return E_FAULTBOX_CANN_NOT_OPEN_FILE;
   }
   if (!parser_.IsOpen()) {
-    TheApp().ReportError(46, pinFilePath_);
-    TheApp().ReportInternalFault(placeNotOpened);
+    TheReporter().ReportError(46, pinFilePath_);
+    TheReporter().ReportInternalFault(placeNotOpened);
     return E_FAULTBOX_FILE_IS_NOT_OPENED;
   }
   return FAULTBOX_OK;
@@ -185,8 +185,8 @@ HRESULT QFCAbstractHardwareInfo::OpenPinFile(int placeCannotOpen, int placeNotOp
 
 HRESULT QFCAbstractHardwareInfo::LoadPinFile(bool additional) {
   if (HRESULT opened = OpenPinFile(738, 739); opened != FAULTBOX_OK) return opened;
-  TheApp().ReportInternal(154);
-  TheApp().ReportInfo(152, pinFilePath_);
+  TheReporter().ReportInternal(154);
+  TheReporter().ReportInfo(152, pinFilePath_);
   pinPlatform_ = -1;
 
   HRESULT hr = CheckTags();
@@ -199,8 +199,8 @@ HRESULT QFCAbstractHardwareInfo::LoadPinFile(bool additional) {
   if (hr == FAULTBOX_OK) hr = ReadPins();
   parser_.Close();
   if (hr == FAULTBOX_OK) {
-    TheApp().ReportInfo(153, pinFilePath_);
-    TheApp().ReportInternal(154);
+    TheReporter().ReportInfo(153, pinFilePath_);
+    TheReporter().ReportInternal(154);
   }
   return hr;
 }
@@ -211,13 +211,14 @@ HRESULT QFCAbstractHardwareInfo::DetectBoardType(std::int32_t& platform) {
   if (hr == FAULTBOX_OK) hr = ReadFormat(true);
   if (hr == FAULTBOX_OK) {
     std::string board;
-    GetFormatValue("BoardType", board);
+    // Without the key the board is unknown and refused below like any other.
+    if (GetFormatValue("BoardType", board) != FAULTBOX_OK) board.clear();
     if (IsKR40Board(board)) {
       platform = fptKR40Platform;
     } else if (IsKR60Board(board)) {
       platform = fptKR60Platform;
     } else {
-      TheApp().ReportError(49, board);
+      TheReporter().ReportError(49, board);
       hr = E_FAULTBOX_BOARD_TYPE_IS_NOT_SUPORTED;
     }
   }
@@ -236,7 +237,7 @@ HRESULT QFCAbstractHardwareInfo::CheckTags() {
   // The comment tags may share a line; a format or signal list block may not
   // (its start line would also be its end).
   if (position[0] > position[1] || position[2] >= position[3] || position[4] >= position[5]) {
-    TheApp().ReportError(144);
+    TheReporter().ReportError(144);
     return E_FAULTBOX_CONSISTENCY_CHECK;
   }
   return FAULTBOX_OK;
@@ -251,7 +252,7 @@ HRESULT QFCAbstractHardwareInfo::ReadFormat(bool additional) {
   try {
     format_ = std::make_unique<FormatTable>();
   } catch (const std::bad_alloc&) {
-    TheApp().ReportInternalFault(49);
+    TheReporter().ReportInternalFault(49);
     return E_FAULTBOX_NULL_POINTER;
   }
   std::string line;
@@ -264,7 +265,7 @@ HRESULT QFCAbstractHardwareInfo::ReadFormat(bool additional) {
     const std::string_view value = fields.size() > 1 ? QFCFSHelper::Trim(fields[1]) : std::string_view();
     if (key.empty() && value.empty()) continue;
     if (value.empty()) {
-      TheApp().ReportWarning(38, std::string(key), parser_.GetTitle());
+      TheReporter().ReportWarning(38, std::string(key), parser_.GetTitle());
       continue;
     }
     (*format_)[QFCFSHelper::ToLower(key)] = std::string(value);
@@ -281,7 +282,7 @@ void QFCAbstractHardwareInfo::ReadAdditionalFiles() {
     additionalFiles_.emplace_back(name);
     ++read;
   }
-  TheApp().ReportInternal(48, std::to_string(read), std::to_string(additionalFiles_.size()));
+  TheReporter().ReportInternal(48, std::to_string(read), std::to_string(additionalFiles_.size()));
 }
 
 void QFCAbstractHardwareInfo::ReadComment() {
@@ -326,7 +327,7 @@ HRESULT QFCAbstractHardwareInfo::ReadHeader() {
         gap = true;
         gapColumn = i + 1;
       } else if (gap) {
-        TheApp().ReportError(112, std::to_string(gapColumn), fileName_);
+        TheReporter().ReportError(112, std::to_string(gapColumn), fileName_);
         return E_FAULTBOX_INVALID_PARAMETER;
       } else {
         columns_.push_back(QFCFSHelper::ToLower(name));
@@ -358,7 +359,7 @@ HRESULT QFCAbstractHardwareInfo::ReadPins() {
     FieldsFrom(line, column, fields);
     const HRESULT hr = ParsePinLine(fields);
     if (hr != FAULTBOX_OK) {
-      TheApp().ReportError(146, std::to_string(number));
+      TheReporter().ReportError(146, std::to_string(number));
       return hr;
     }
   }
@@ -368,7 +369,7 @@ HRESULT QFCAbstractHardwareInfo::ReadPins() {
 HRESULT QFCAbstractHardwareInfo::ParsePinLine(const std::vector<std::string_view>& fields) {
   std::unique_ptr<QFCAbstractPin> pin = CreatePin();
   if (!pin) {
-    TheApp().ReportInternalFault(50);
+    TheReporter().ReportInternalFault(50);
     return E_FAULTBOX_NULL_POINTER;
   }
   pin->SetFileName(parser_.GetTitle());
@@ -382,19 +383,19 @@ HRESULT QFCAbstractHardwareInfo::ParsePinLine(const std::vector<std::string_view
   for (; f < fields.size() && c < columns_.size(); ++f, ++c) {
     const std::string_view value = QFCFSHelper::Trim(fields[f]);
     if (value.empty()) {
-      TheApp().ReportError(111, parser_.GetTitle());
+      TheReporter().ReportError(111, parser_.GetTitle());
       return E_FAULTBOX_CONSISTENCY_CHECK;
     }
     if (columns_[c] == "not defined") continue;
     const HRESULT hr = pin->SetValue(columns_[c], std::string(value));
     if (hr != FAULTBOX_OK) {
-      TheApp().ReportError(147, std::to_string(f + offset));
+      TheReporter().ReportError(147, std::to_string(f + offset));
       return hr;
     }
   }
   if (c < columns_.size()) {
-    TheApp().ReportError(147, std::to_string(f + offset));
-    TheApp().ReportError(148);
+    TheReporter().ReportError(147, std::to_string(f + offset));
+    TheReporter().ReportError(148);
     return E_FAULTBOX_CONSISTENCY_CHECK;
   }
   pin->SetEcuVersion(ecuVersion_);
@@ -410,7 +411,7 @@ HRESULT QFCAbstractHardwareInfo::ParsePinLine(const std::vector<std::string_view
       const std::string pinName = pin->PinName();
       const std::string detail = "Value: " + pinName + ", pin name: " + pinName + ", ECU name: " + ecuName +
                                  ", File name: " + fileName_;
-      TheApp().ReportError(114, pinName, detail);
+      TheReporter().ReportError(114, pinName, detail);
       return E_FAULTBOX_CONSISTENCY_CHECK;
     }
     return FAULTBOX_OK;

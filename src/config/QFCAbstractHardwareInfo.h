@@ -15,7 +15,7 @@
 #include "config/QFCAbstractPin.h"
 #include "config/QFCCSVFileParser.h"
 #include "config/QFCECU.h"
-#include "host/ResultCodes.h"
+#include "platform/ResultCodes.h"
 
 namespace faultbox {
 
@@ -33,31 +33,29 @@ class QFCAbstractHardwareInfo : public QFCAbstractObjectData {
   ~QFCAbstractHardwareInfo() override;
 
   // ---- platform operations ----
-  virtual HRESULT CheckMandatoryColumns();
+  [[nodiscard]] virtual HRESULT CheckMandatoryColumns();
   // Checks the format keys; `additional` is set for a file that another pin
   // file names and during board type detection (only "BoardType" required).
-  virtual HRESULT EvaluateFormat(bool additional);
-  // The second entry to the column check.
-  HRESULT CheckColumns() { return CheckMandatoryColumns(); }
+  [[nodiscard]] virtual HRESULT EvaluateFormat(bool additional);
   virtual std::unique_ptr<QFCAbstractPin> CreatePin();
 
   // ---- loading ----
   // Reads the whole pin file; stops at the first bad pin line, keeping the
   // pins of earlier lines. A second load replaces format table, header and
   // comment and adds to the ECUs.
-  HRESULT LoadPinFile(bool additional);
+  [[nodiscard]] HRESULT LoadPinFile(bool additional);
   // Reads only tags and format block and sets `platform` from "BoardType".
-  HRESULT DetectBoardType(std::int32_t& platform);
+  [[nodiscard]] HRESULT DetectBoardType(std::int32_t& platform);
   void SetPinFilePath(const std::string& path);
 
   // ---- answers ----
   // FAULTBOX_OK with the value, E_FAULTBOX_CONSISTENCY_CHECK without a report
   // when the key is absent (message 35 first when no format block was read).
-  HRESULT GetFormatValue(std::string_view key, std::string& value) const;
+  [[nodiscard]] HRESULT GetFormatValue(std::string_view key, std::string& value) const;
   // fptKR40Platform, fptKR60Platform, or 0 (message 49, class 2).
   std::int32_t GetPlatformFromBoardType() const;
   // The name of potential 0 to 4.
-  HRESULT GetPotential(int index, std::string& name) const;
+  [[nodiscard]] HRESULT GetPotential(int index, std::string& name) const;
   // "FIULoadAddress" and "RSIMLoadAddress" as written, "" when absent.
   std::string GetFIULoadModule() const;
   std::string GetRSIMLoadModule() const;
@@ -79,28 +77,27 @@ class QFCAbstractHardwareInfo : public QFCAbstractObjectData {
   QFCECU* GetEcu(int index) const;
   QFCECU* FindEcu(std::string_view name) const;
   std::size_t GetPinCount() const;
-  QFCAbstractObjectData* GetOwningSystem() const { return GetOwner(); }
 
  protected:
   // The three columns every platform requires; message 39 names the first
   // missing one.
-  HRESULT CheckCommonColumns();
+  [[nodiscard]] HRESULT CheckCommonColumns();
   // Message 50 for a missing key.
   bool RequireKey(std::string_view key) const;
   // The platform the pins of this load get, decided once per load.
   std::int32_t PinPlatform() const;
 
  private:
-  HRESULT CheckTags();
-  HRESULT ReadFormat(bool additional);
+  [[nodiscard]] HRESULT CheckTags();
+  [[nodiscard]] HRESULT ReadFormat(bool additional);
   void ReadAdditionalFiles();
   void ReadComment();
-  HRESULT ReadHeader();
-  HRESULT ReadPins();
-  HRESULT ParsePinLine(const std::vector<std::string_view>& fields);
+  [[nodiscard]] HRESULT ReadHeader();
+  [[nodiscard]] HRESULT ReadPins();
+  [[nodiscard]] HRESULT ParsePinLine(const std::vector<std::string_view>& fields);
   // Opens the pin file for reading; a failure is reported (message 46 and
   // the internal fault of the given place) and returned.
-  HRESULT OpenPinFile(int placeCannotOpen, int placeNotOpened);
+  [[nodiscard]] HRESULT OpenPinFile(int placeCannotOpen, int placeNotOpened);
   std::int32_t FindOrReport(std::string_view tag, std::int32_t start);
 
   QFCCSVFileParser parser_;

@@ -5,7 +5,7 @@
 
 #include "config/QFCECU.h"
 #include "config/QFCFSHelper.h"
-#include "host/QFCFaultboxApp.h"
+#include "platform/QFCReporter.h"
 #include "platform/Archive.h"
 #include "platform/MessageTable.h"
 
@@ -109,7 +109,7 @@ HRESULT QFCAbstractPin::SetValue(const std::string& column, const std::string& v
   const std::string key = HasUpper(column) ? QFCFSHelper::ToLower(column) : column;
   if (values_.Contains(key)) {
     if (key == GetRepeatableColumn()) return FAULTBOX_OK;
-    TheApp().ReportWarning(40, key, fileName_);
+    TheReporter().ReportWarning(40, key, fileName_);
     return E_FAULTBOX_INVALID_PARAMETER;
   }
   if (key == GetFailureClassColumn()) ForgetFailureClasses();
@@ -124,7 +124,7 @@ std::optional<std::string_view> QFCAbstractPin::FindValue(std::string_view colum
 int QFCAbstractPin::GetValue(std::string_view column, std::string& value) const {
   const std::optional<std::string_view> found = FindValue(column);
   if (!found) {
-    TheApp().ReportError(39, std::string(column), fileName_);
+    TheReporter().ReportError(39, std::string(column), fileName_);
     return kMissing;
   }
   value.assign(*found);
@@ -159,7 +159,7 @@ std::string QFCAbstractPin::DetailText(std::string_view value) const {
 }
 
 void QFCAbstractPin::ReportInvalid(std::string_view column, std::string_view value) const {
-  TheApp().ReportError(37, std::string(column), DetailText(value));
+  TheReporter().ReportError(37, std::string(column), DetailText(value));
 }
 
 void QFCAbstractPin::ForgetFailureClasses() {
@@ -221,7 +221,7 @@ void QFCAbstractPin::SetPresent(bool present) {
   if (!present && IsConnected()) {
     char address[16];
     std::snprintf(address, sizeof address, "0x%X", GetModuleAddress());
-    TheApp().ReportWarning(109, address, PinName());
+    TheReporter().ReportWarning(109, address, PinName());
   }
   present_ = present;
 }
@@ -233,7 +233,7 @@ HRESULT QFCAbstractPin::Validate() {
   if (pin == kNotUsed) return W_FAULTBOX_PIN_NOT_USED_FOR_FAULT_INJECTION;
   const int ecu = GetEcuName(ecuName);
   if (ecu == kNotUsed) {
-    TheApp().ReportError(41, "ecu_name", DetailText(ecuName));
+    TheReporter().ReportError(41, "ecu_name", DetailText(ecuName));
     return E_FAULTBOX_CONSISTENCY_CHECK;
   }
   if (pin == kMissing || ecu == kMissing) return E_FAULTBOX_CONSISTENCY_CHECK;
@@ -307,7 +307,7 @@ void QFCAbstractPin::LoadCompared(Archive& ar) {
   const std::string where =
       "pin name: " + PinName() + ", ECU name: " + EcuName() + ", File name: " + fileName_;
   auto differs = [&](std::string_view column) {
-    TheApp().ReportWarning(142, std::string(column), where);
+    TheReporter().ReportWarning(142, std::string(column), where);
     SetModified();
     if (QFCAbstractObjectData* system = GetSystem()) system->SetChanged(true);
   };

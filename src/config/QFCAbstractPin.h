@@ -13,7 +13,7 @@
 #include <vector>
 
 #include "config/QFCAbstractObjectData.h"
-#include "host/ResultCodes.h"
+#include "platform/ResultCodes.h"
 
 namespace faultbox {
 
@@ -90,9 +90,9 @@ class QFCAbstractPin : public QFCAbstractObjectData {
   virtual const QFCPinValueTable& GetValues() const { return values_; }
   // The checks of the pin's line; W_FAULTBOX_PIN_NOT_USED_FOR_FAULT_INJECTION
   // means the line is not used, any other failure refuses the line.
-  virtual HRESULT Validate();
+  [[nodiscard]] virtual HRESULT Validate();
   // Whether one failure class entry has the platform's form.
-  virtual HRESULT CheckFailureClassEntry(const std::string& entry) const;
+  [[nodiscard]] virtual HRESULT CheckFailureClassEntry(const std::string& entry) const;
   // The module channel(s) the pin uses, as far as they can be read; no messages.
   virtual std::vector<std::uint32_t> GetModuleChannels() const { return {}; }
   // The two columns a document stores for the platform and compares on load.
@@ -102,7 +102,7 @@ class QFCAbstractPin : public QFCAbstractObjectData {
   // Stores a value under the lower-cased column. A column given twice is
   // refused (message 40) unless it is the repeatable one, which keeps its
   // first value.
-  HRESULT SetValue(const std::string& column, const std::string& value);
+  [[nodiscard]] HRESULT SetValue(const std::string& column, const std::string& value);
   // kMissing (message 39), kNotUsed or kPresent.
   int GetValue(std::string_view column, std::string& value) const;
   // The value without any report; none when the column is missing.

@@ -11,7 +11,7 @@
 #include <new>
 
 #include "config/QFCFSHelper.h"
-#include "host/QFCFaultboxApp.h"
+#include "platform/QFCReporter.h"
 #include "platform/FileHelper.h"
 
 namespace faultbox {
@@ -68,7 +68,7 @@ bool QFCCSVFileParser::Open(const std::string& path) {
   extension_ = path.size() >= 3 ? path.substr(path.size() - 3) : path;
   if (path.empty()) return false;
   if (path.size() < 3 || QFCFSHelper::ToUpper(extension_) != "CSV") {
-    TheApp().ReportInternal(72);
+    TheReporter().ReportInternal(72);
     return false;
   }
   // Non-blocking so that a FIFO or device named *.csv cannot hang the open.
@@ -76,17 +76,17 @@ bool QFCCSVFileParser::Open(const std::string& path) {
   struct stat st {};
   if (fd < 0 || ::fstat(fd, &st) != 0 || !S_ISREG(st.st_mode)) {
     if (fd >= 0) ::close(fd);
-    TheApp().ReportInternal(46, path);
+    TheReporter().ReportInternal(46, path);
     return false;
   }
   if (st.st_size == 0) {
     ::close(fd);
-    TheApp().ReportInternal(73, path);
+    TheReporter().ReportInternal(73, path);
     return false;
   }
   if (st.st_size > kMaxFileSize) {
     ::close(fd);
-    TheApp().ReportInternalFault(187);
+    TheReporter().ReportInternalFault(187);
     return false;
   }
   try {
@@ -94,7 +94,7 @@ bool QFCCSVFileParser::Open(const std::string& path) {
   } catch (const std::bad_alloc&) {
     ::close(fd);
     data_ = std::string();
-    TheApp().ReportInternalFault(186);
+    TheReporter().ReportInternalFault(186);
     return false;
   }
   std::size_t got = 0;
@@ -104,7 +104,7 @@ bool QFCCSVFileParser::Open(const std::string& path) {
     if (n < 0) {
       ::close(fd);
       data_ = std::string();
-      TheApp().ReportInternalFault(187);
+      TheReporter().ReportInternalFault(187);
       return false;
     }
     if (n == 0) break;  // the file shrank since fstat: take what is there
@@ -113,7 +113,7 @@ bool QFCCSVFileParser::Open(const std::string& path) {
   ::close(fd);
   data_.resize(got);
   if (data_.empty()) {
-    TheApp().ReportInternal(73, path);
+    TheReporter().ReportInternal(73, path);
     return false;
   }
   open_ = true;
@@ -163,7 +163,7 @@ std::int32_t QFCCSVFileParser::FindTag(std::string_view tag, std::int32_t start)
   filePosition_ = static_cast<std::size_t>(start);
   for (;;) {
     if (currentPosition_ >= endPosition_) {
-      TheApp().ReportInternal(76, std::string(tag));
+      TheReporter().ReportInternal(76, std::string(tag));
       return -1;
     }
     std::size_t next = 0;

@@ -43,7 +43,6 @@ class QFCCSVFileParser {
   std::int32_t GetTagColumn() const { return tagColumn_; }
   const std::string& GetTitle() const { return title_; }
   const std::string& GetPath() const { return path_; }
-  const std::string& GetExtension() const { return extension_; }
   bool IsOpen() const { return open_; }
   std::int32_t GetEndPosition() const { return endPosition_; }
 

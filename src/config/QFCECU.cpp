@@ -4,7 +4,7 @@
 #include <algorithm>
 #include <functional>
 
-#include "host/QFCFaultboxApp.h"
+#include "platform/QFCReporter.h"
 
 namespace faultbox {
 
@@ -85,11 +85,11 @@ bool QFCECU::AreAllPinsPresent() const {
 
 bool QFCECU::SetEnabled(bool enabled, bool quiet) {
   if (IsReadOnly() && !quiet) {
-    TheApp().ReportError(136, GetName());
+    TheReporter().ReportError(136, GetName());
     return false;
   }
   if (!enabled && IsPatternActivated()) {
-    TheApp().ReportError(132, GetName());
+    TheReporter().ReportError(132, GetName());
     return false;
   }
   enabled_ = enabled;

@@ -11,11 +11,6 @@ namespace {
 constexpr int kResNotConfigured = 6787;
 constexpr int kResNoPotential = 8905;
 
-std::string ResourceText(int id) {
-  const char* text = ResourceString(id);
-  return text ? text : "";
-}
-
 }  // namespace
 
 QFCExternHardware::QFCExternHardware(std::string kindText, std::int32_t type)

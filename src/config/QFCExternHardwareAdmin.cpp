@@ -2,9 +2,8 @@
 
 #include <new>
 
-#include "host/QFCFaultboxApp.h"
+#include "platform/QFCReporter.h"
 #include "platform/MessageTable.h"
-#include "systems/QFCSystem.h"
 
 namespace faultbox {
 
@@ -12,7 +11,6 @@ namespace {
 
 constexpr int kResNoPotential = 8905;
 
-constexpr int kPlaceCreateNoSystem = 206;
 constexpr int kPlaceCreateFirstItem = 210;  // 210 ... 214 in the order of creation
 constexpr int kPlaceIsConnectedType = 455;
 constexpr int kPlacePotentialNames = 2501;
@@ -26,15 +24,6 @@ bool IsChoiceKind(std::int32_t kind) {
 }
 
 }  // namespace
-
-HRESULT QFCExternHardwareAdmin::Create(const QFCSystem* system) {
-  if (!system) {
-    Clear();
-    TheApp().ReportInternalFault(kPlaceCreateNoSystem);
-    return E_FAULTBOX_NULL_POINTER;
-  }
-  return Create(system->GetPotentialNames());
-}
 
 HRESULT QFCExternHardwareAdmin::Create(const std::vector<std::string>& potentials) {
   Clear();
@@ -53,7 +42,7 @@ HRESULT QFCExternHardwareAdmin::Create(const std::vector<std::string>& potential
   for (int i = 0; i < 5; ++i) {
     std::unique_ptr<QFCExternHardware> item(made[i]);
     if (!item && result == FAULTBOX_OK) {
-      TheApp().ReportInternalFault(kPlaceCreateFirstItem + i);
+      TheReporter().ReportInternalFault(kPlaceCreateFirstItem + i);
       result = E_FAULTBOX_NULL_POINTER;
     }
     items.push_back(std::move(item));
@@ -72,7 +61,7 @@ QFCExternHardware* QFCExternHardwareAdmin::FindItem(std::int32_t type) const {
 
 QFCExternHardwarePot* QFCExternHardwareAdmin::PotentialItem(int place) const {
   auto* pot = dynamic_cast<QFCExternHardwarePot*>(FindItem(QFCExternHardware::kPotential));
-  if (!pot) TheApp().ReportInternalFault(place);
+  if (!pot) TheReporter().ReportInternalFault(place);
   return pot;
 }
 
@@ -170,7 +159,7 @@ bool QFCExternHardwareAdmin::GetConnection(std::int32_t type, std::int32_t chann
 bool QFCExternHardwareAdmin::IsConnected(std::int32_t type) const {
   if (type != QFCExternHardware::kResistor && type != QFCExternHardware::kMeasurement &&
       type != QFCExternHardware::kSource) {
-    TheApp().ReportInternalFault(kPlaceIsConnectedType);
+    TheReporter().ReportInternalFault(kPlaceIsConnectedType);
     return false;
   }
   const QFCExternHardware* item = FindItem(type);

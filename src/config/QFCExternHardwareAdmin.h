@@ -10,12 +10,11 @@
 #include <vector>
 
 #include "config/QFCExternHardware.h"
-#include "host/ResultCodes.h"
+#include "platform/ResultCodes.h"
 
 namespace faultbox {
 
 class Archive;
-class QFCSystem;
 
 class QFCExternHardwareAdmin {
  public:
@@ -30,12 +29,9 @@ class QFCExternHardwareAdmin {
   QFCExternHardwareAdmin(const QFCExternHardwareAdmin&) = delete;
   QFCExternHardwareAdmin& operator=(const QFCExternHardwareAdmin&) = delete;
 
-  // Replaces the list with the five items, the potential names taken from
-  // the system; both potential choices become no potential. A failure leaves
-  // the list empty and gives E_FAULTBOX_NULL_POINTER.
-  HRESULT Create(const QFCSystem* system);
-  // The same from the five potential names themselves.
-  HRESULT Create(const std::vector<std::string>& potentials);
+  // Replaces the list with the five items named after the system's five
+  // potentials; both potential choices become no potential.
+  [[nodiscard]] HRESULT Create(const std::vector<std::string>& potentials);
   void Clear() { items_.clear(); }
 
   const std::vector<std::unique_ptr<QFCExternHardware>>& GetItems() const { return items_; }

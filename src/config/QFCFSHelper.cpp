@@ -5,14 +5,19 @@
 #include "platform/Text.h"
 
 #include <algorithm>
+#include <limits>
+#include <optional>
 #include <set>
 
-#include "host/QFCFaultboxApp.h"
+#include "platform/QFCReporter.h"
 #include "platform/FileHelper.h"
 #include "platform/MessageTable.h"
+#include "platform/Settings.h"
 
 namespace faultbox {
 namespace {
+
+constexpr int kMsgInvalidValue = 37;
 
 // Characters that make a number text invalid in both bases; they mark unused
 // values, separators and quoting in pin files. The bytes 0xA7 ... 0xFC are the
@@ -92,7 +97,7 @@ bool QFCFSHelper::StringToNumberStrict(std::string_view text, std::uint32_t& val
 bool QFCFSHelper::ParseModuleAddress(std::string_view text, std::uint32_t& cabinet, std::uint32_t& rack,
                                      std::uint32_t& slot, bool report) {
   if (text == "none" || text == "-" || text == "#") {
-    if (report) TheApp().ReportInternalFault(656);
+    if (report) TheReporter().ReportInternalFault(656);
     return false;
   }
   std::string_view parts[3];
@@ -100,7 +105,7 @@ bool QFCFSHelper::ParseModuleAddress(std::string_view text, std::uint32_t& cabin
   for (std::size_t pos = 0;; ++count) {
     const std::size_t end = text.find('_', pos);
     if (count == 3) {  // a fourth part
-      if (report) TheApp().ReportInternal(34, std::string(text));
+      if (report) TheReporter().ReportInternal(34, std::string(text));
       return false;
     }
     parts[count] = text.substr(pos, end == std::string_view::npos ? std::string_view::npos : end - pos);
@@ -119,7 +124,7 @@ bool QFCFSHelper::ParseModuleAddress(std::string_view text, std::uint32_t& cabin
   std::uint32_t read[3] = {0, 0, 0};
   for (std::size_t i = 0; i < count; ++i) {
     if (!StringToNumber(parts[i], read[i], 10) || read[i] > order[i].max) {
-      if (report) TheApp().ReportInternal(34, ResourceString(order[i].nameId), std::string(text));
+      if (report) TheReporter().ReportInternal(34, ResourceString(order[i].nameId), std::string(text));
       return false;
     }
   }
@@ -194,6 +199,21 @@ void QFCFSHelper::Split(std::string_view text, char separator, std::vector<std::
     out.push_back(text.substr(pos, end - pos));
     pos = end + 1;
   }
+}
+
+std::int32_t QFCFSHelper::ReadCountSetting(const char* section, const char* key,
+                                                 std::int32_t fallback) {
+  const std::optional<std::string> text = Settings::GetString(section, key);
+  if (!text) return fallback;
+  std::uint32_t value = 0;
+  // An empty value would convert to 0 and make every wait fail at once: it is
+  // no number, like any other text the conversion refuses.
+  if (Trim(*text).empty() || !StringToNumber(*text, value, 10) ||
+      value > static_cast<std::uint32_t>(std::numeric_limits<std::int32_t>::max())) {
+    TheReporter().ReportWarning(kMsgInvalidValue, key, "Value: " + *text + ", File: " + Settings::Path());
+    return fallback;
+  }
+  return static_cast<std::int32_t>(value);
 }
 
 }  // namespace faultbox

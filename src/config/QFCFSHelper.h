@@ -41,6 +41,10 @@ class QFCFSHelper {
   static std::string ToBitString(std::uint32_t low, std::uint32_t high);
   // True when a file or folder of that name exists ('\' counts as separator).
   static bool PathExists(const std::string& path);
+  // A decimal count of the settings file, `fallback` when it is missing; a
+  // value that is not a decimal number from 0 up is reported (message 37,
+  // class 2) and `fallback` used.
+  static std::int32_t ReadCountSetting(const char* section, const char* key, std::int32_t fallback);
 
   // The one place where "without regard to case" is decided: ASCII letters
   // fold, every other byte compares as it is.

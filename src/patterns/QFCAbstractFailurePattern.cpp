@@ -5,7 +5,8 @@
 #include "comm/QFCAbstractTransferInterface.h"
 #include "config/QFCAbstractFailureClasses.h"
 #include "config/QFCAbstractPin.h"
-#include "host/QFCFaultboxApp.h"
+#include "platform/QFCReporter.h"
+#include "platform/UserMode.h"
 #include "patterns/QFCAbstractFailurePatternPin.h"
 #include "patterns/QFCAbstractFailurePatternSafetyInterlock.h"
 #include "patterns/QFCFailurePatternPins.h"
@@ -51,26 +52,8 @@ QFCAbstractFailurePattern::~QFCAbstractFailurePattern() {
   pins_.reset();
 }
 
-std::string QFCAbstractFailurePattern::ResourceText(int id, std::initializer_list<std::string_view> args) {
-  const char* format = ResourceString(id);
-  std::string text = format ? format : std::to_string(id);
-  std::string out;
-  auto next = args.begin();
-  for (std::size_t i = 0; i < text.size(); ++i) {
-    const bool placeholder = text[i] == '%' && i + 1 < text.size() &&
-                             (text[i + 1] == 's' || text[i + 1] == 'd' || text[i + 1] == 'i');
-    if (placeholder && next != args.end()) {
-      out += *next++;
-      ++i;
-    } else {
-      out += text[i];
-    }
-  }
-  return out;
-}
-
 bool QFCAbstractFailurePattern::IsServiceMode() {
-  return TheApp().GetUserMode() == 2;
+  return GetUserMode() == 2;
 }
 
 QFCAbstractFailureClasses* QFCAbstractFailurePattern::GetFailureClasses() const {
@@ -79,7 +62,7 @@ QFCAbstractFailureClasses* QFCAbstractFailurePattern::GetFailureClasses() const 
 
 bool QFCAbstractFailurePattern::CheckWritable() const {
   if (!IsReadOnly()) return true;
-  TheApp().ReportError(kMsgReadOnly, system_ ? system_->GetName() : std::string());
+  TheReporter().ReportError(kMsgReadOnly, system_ ? system_->GetName() : std::string());
   return false;
 }
 
@@ -179,7 +162,7 @@ int QFCAbstractFailurePattern::GetPinCount() const {
 
 QFCAbstractFailurePatternPin* QFCAbstractFailurePattern::GetPinAt(int index) const {
   if (!pins_ || index < 0 || index >= pins_->GetCount()) {
-    TheApp().ReportInternal(kMsgPinIndex, std::to_string(index));
+    TheReporter().ReportInternal(kMsgPinIndex, std::to_string(index));
     return nullptr;
   }
   return pins_->GetAt(index);
@@ -217,7 +200,7 @@ void QFCAbstractFailurePattern::ResetPinConfigs(const std::vector<QFCAbstractFai
   for (QFCAbstractFailurePatternPin* pin : pins) {
     if (pin == nullptr || pin->GetPattern() != this) continue;
     if (pin->IsActivated()) {
-      TheApp().ReportWarning(kMsgActivatedNotReset, pin->GetPinName());
+      TheReporter().ReportWarning(kMsgActivatedNotReset, pin->GetPinName());
       continue;
     }
     pin->SetPinConfigs({0, 0, 0, 0, 0});
@@ -284,14 +267,15 @@ void QFCAbstractFailurePattern::ClearActivatedFlags() {
 
 void QFCAbstractFailurePattern::ResetHardwareAfterFailure() {
   if (collection_) {
-    collection_->ResetHardware();
+    // The reset reports its own failure; the caller returns the transfer's.
+    (void)collection_->ResetHardware();
   } else {
     ClearActivatedFlags();
   }
 }
 
 HRESULT QFCAbstractFailurePattern::InternalFault(int place) {
-  TheApp().ReportInternalFault(place);
+  TheReporter().ReportInternalFault(place);
   return E_FAULTBOX_NULL_POINTER;
 }
 
@@ -303,7 +287,7 @@ QFCAbstractTransferInterface* QFCAbstractFailurePattern::ConnectedTransferInterf
     return nullptr;
   }
   if (!transfer->IsConnected()) {
-    TheApp().ReportError(kMsgNotConnected);
+    TheReporter().ReportError(kMsgNotConnected);
     result = E_FAULTBOX_NOT_CONNECTED_TO_HARDWARE;
     return nullptr;
   }
@@ -311,7 +295,7 @@ QFCAbstractTransferInterface* QFCAbstractFailurePattern::ConnectedTransferInterf
 }
 
 HRESULT QFCAbstractFailurePattern::ActivatePattern(bool activate) {
-  TheApp().ReportInfo(activate ? kMsgActivating : kMsgDeactivating, GetName());
+  TheReporter().ReportInfo(activate ? kMsgActivating : kMsgDeactivating, GetName());
   // Nothing is on the hardware: nothing to send, connected or not.
   if (!activate && !IsAnyPinActivated()) return FAULTBOX_OK;
 
@@ -320,15 +304,15 @@ HRESULT QFCAbstractFailurePattern::ActivatePattern(bool activate) {
   // At most one pattern of a system holds activated pins.
   QFCAbstractFailurePattern* active = nullptr;
   if (collection_ && collection_->GetActivatedPattern(active) && active != this) {
-    TheApp().ReportError(kMsgOtherPatternActive, active->GetName());
+    TheReporter().ReportError(kMsgOtherPatternActive, active->GetName());
     return E_FAULTBOX;
   }
   if (CountSelectedPins() == 0) {
-    TheApp().ReportError(kMsgNoPinSelected);
+    TheReporter().ReportError(kMsgNoPinSelected);
     return E_FAULTBOX;
   }
   if (!CanAnyPinBeActivated()) {
-    TheApp().ReportError(kMsgNoPinCanBeActivated);
+    TheReporter().ReportError(kMsgNoPinCanBeActivated);
     return E_FAULTBOX_FAILURECLASS_NOT_CONFIGURATED;
   }
   for (const auto& pin : pins_->GetList())
@@ -336,7 +320,7 @@ HRESULT QFCAbstractFailurePattern::ActivatePattern(bool activate) {
 
   QFCMessageList messages;
   if (!BuildMessages(messages, activate)) {
-    TheApp().ReportError(kMsgBuildFailed);
+    TheReporter().ReportError(kMsgBuildFailed);
     result = E_FAULTBOX_MESSAGE_BUILD;
   } else {
     result = TransferMessages(messages, activate);
@@ -360,48 +344,48 @@ HRESULT QFCAbstractFailurePattern::CheckFailureClassChoice(QFCAbstractFailurePat
                                                            std::int32_t relayVectorIndex,
                                                            std::uint64_t& mask) {
   if (IsReadOnly()) {
-    TheApp().ReportError(kMsgReadOnly, system_ ? system_->GetName() : std::string());
+    TheReporter().ReportError(kMsgReadOnly, system_ ? system_->GetName() : std::string());
     return E_FAULTBOX;
   }
   if (pin == nullptr || pin->GetPattern() != this || pin->GetPin() == nullptr) {
-    TheApp().ReportInternalFault(kPlaceChoiceInvalidPin);
+    TheReporter().ReportInternalFault(kPlaceChoiceInvalidPin);
     return E_FAULTBOX_NULL_POINTER;
   }
   if (!pin->IsFromPinFile()) {
-    TheApp().ReportError(kMsgPinDeleted, pin->GetPinName(), pin->GetEcuName());
+    TheReporter().ReportError(kMsgPinDeleted, pin->GetPinName(), pin->GetEcuName());
     return E_FAULTBOX_PIN_WAS_DELETED_FROM_PIN_FILE;
   }
   if (IsAnyPinActivated()) {
-    TheApp().ReportError(kMsgPatternActivated);
+    TheReporter().ReportError(kMsgPatternActivated);
     return E_FAULTBOX_FAILURE_PATTERN_ARE_ACTIVATED;
   }
   if (!pin->HasDefinedFailureClass(failureClassId)) {
-    TheApp().ReportError(kMsgClassNotDefined, pin->GetPinName());
+    TheReporter().ReportError(kMsgClassNotDefined, pin->GetPinName());
     return E_FAULTBOX;
   }
   QFCAbstractFailureClasses* classes = GetFailureClasses();
   QFCAbstractFailureClass* failureClass = classes ? classes->FindById(failureClassId) : nullptr;
   if (failureClass == nullptr) {
-    TheApp().ReportError(kMsgClassNotFound,
+    TheReporter().ReportError(kMsgClassNotFound,
                          std::to_string(failureClassId) + "(" + std::to_string(relayVectorIndex) + ")");
     return E_FAULTBOX;
   }
   // A negative index names no relay vector either.
   if (relayVectorIndex < 0 || relayVectorIndex >= failureClass->GetPossibilityCount()) {
-    TheApp().ReportError(kMsgRelayVectorIndex, std::to_string(failureClassId),
+    TheReporter().ReportError(kMsgRelayVectorIndex, std::to_string(failureClassId),
                          std::to_string(relayVectorIndex));
     return E_FAULTBOX_INVALID_PARAMETER;
   }
   if (!IsFailureClassAllowed(pin, failureClassId)) {
-    TheApp().ReportError(kMsgClassRefused);
+    TheReporter().ReportError(kMsgClassRefused);
     return E_FAULTBOX;
   }
   if (failureClass->GetPossibilityCount() == 0) {
-    TheApp().ReportInternalFault(kPlaceChoiceNoClasses);
+    TheReporter().ReportInternalFault(kPlaceChoiceNoClasses);
     return E_FAULTBOX_INVALID_PARAMETER;
   }
   if (!failureClass->GetRelayMask(relayVectorIndex, mask)) {
-    TheApp().ReportInternalFault(kPlaceChoiceNoMask);
+    TheReporter().ReportInternalFault(kPlaceChoiceNoMask);
     return E_FAULTBOX_INVALID_PARAMETER;
   }
   return FAULTBOX_OK;

@@ -12,8 +12,8 @@
 
 #include "comm/QFCAbstractTransferInterface.h"
 #include "config/QFCAbstractObjectData.h"
-#include "host/ResultCodes.h"
-#include "patterns/QFCAbstractMessage.h"
+#include "platform/ResultCodes.h"
+#include "comm/QFCAbstractMessage.h"
 
 namespace faultbox {
 
@@ -47,12 +47,12 @@ class QFCAbstractFailurePattern : public QFCAbstractObjectData {
   virtual bool Reset();
   // Runs the interlock after a change of `pin` (nullptr: of the pattern).
   virtual bool OnPinChanged(QFCAbstractFailurePatternPin* pin);
-  virtual HRESULT Initialize();
+  [[nodiscard]] virtual HRESULT Initialize();
   // A fresh pin of the platform that stands in for a pin lost from the pin file.
   virtual std::unique_ptr<QFCAbstractPin> CreatePlaceholderPin();
   // Gives the pin the failure class and relay vector by translating them into
   // the pin's settings and letting the interlock derive the class again.
-  virtual HRESULT SetFailureClass(QFCAbstractFailurePatternPin* pin, std::int32_t failureClassId,
+  [[nodiscard]] virtual HRESULT SetFailureClass(QFCAbstractFailurePatternPin* pin, std::int32_t failureClassId,
                                   std::int32_t relayVectorIndex);
   // Positions 0 to 4 of `vector` become 1 where the pin's PinConfig entry is 1, else 0.
   virtual bool FillRequirementVector(const QFCAbstractFailurePatternPin* pin,
@@ -60,7 +60,7 @@ class QFCAbstractFailurePattern : public QFCAbstractObjectData {
   // Destroys the interlock, the pins and the platform's other owned objects.
   virtual void ReleaseParts();
   virtual void FreeMessages(QFCMessageList& messages);
-  virtual HRESULT TransferMessages(QFCMessageList& messages, bool activate);
+  [[nodiscard]] virtual HRESULT TransferMessages(QFCMessageList& messages, bool activate);
   virtual bool BuildMessages(QFCMessageList& messages, bool activate);
   // A new pattern pin of the platform (not yet holding a pin).
   virtual std::unique_ptr<QFCAbstractFailurePatternPin> CreatePatternPin();
@@ -84,7 +84,7 @@ class QFCAbstractFailurePattern : public QFCAbstractObjectData {
   bool ClearAllPinConfigs();
 
   // ---- activation ----
-  HRESULT ActivatePattern(bool activate);
+  [[nodiscard]] HRESULT ActivatePattern(bool activate);
   bool IsAnyPinActivated() const;
   int CountSelectedPins() const;
   bool CanAnyPinBeActivated() const;
@@ -120,9 +120,6 @@ class QFCAbstractFailurePattern : public QFCAbstractObjectData {
 
   // Message 118 naming the system when the document is read-only; true when writable.
   bool CheckWritable() const;
-  // A numbered resource string with its %s / %d / %i placeholders filled in
-  // order. Filled by hand: the format comes from a table, never from printf.
-  static std::string ResourceText(int id, std::initializer_list<std::string_view> args = {});
 
  protected:
   // The shared part of Reset.
@@ -130,7 +127,7 @@ class QFCAbstractFailurePattern : public QFCAbstractObjectData {
   // Steps 1 to 9 of choosing a failure class for a pin, shared by the
   // platforms: the refusals with their messages, then the chosen relay
   // vector's mask.
-  HRESULT CheckFailureClassChoice(QFCAbstractFailurePatternPin* pin, std::int32_t failureClassId,
+  [[nodiscard]] HRESULT CheckFailureClassChoice(QFCAbstractFailurePatternPin* pin, std::int32_t failureClassId,
                                   std::int32_t relayVectorIndex, std::uint64_t& mask);
   // After a failed transfer: the system's hardware reset, so that no relay stays switched.
   void ResetHardwareAfterFailure();
@@ -151,7 +148,7 @@ class QFCAbstractFailurePattern : public QFCAbstractObjectData {
   }
   // An internal fault at `place`, for a part that is missing or not of the
   // kind it should be; gives E_FAULTBOX_NULL_POINTER.
-  static HRESULT InternalFault(int place);
+  [[nodiscard]] static HRESULT InternalFault(int place);
 
   std::unique_ptr<QFCFailurePatternPins> pins_;
   std::unique_ptr<QFCAbstractFailurePatternSafetyInterlock> interlock_;

@@ -1,6 +1,7 @@
 // The shared pattern pin: names and module of the referenced pin, PinConfig
 // changes, and the failure class the interlock gives it.
 #include "patterns/QFCAbstractFailurePatternPin.h"
+#include "platform/MessageTable.h"
 
 #include <cstdio>
 
@@ -8,7 +9,7 @@
 #include "config/QFCAbstractPin.h"
 #include "config/QFCECU.h"
 #include "config/QFCFSHelper.h"
-#include "host/QFCFaultboxApp.h"
+#include "platform/QFCReporter.h"
 #include "patterns/QFCAbstractFailurePattern.h"
 #include "systems/QFCSystem.h"
 
@@ -58,7 +59,7 @@ bool EntryToId(const std::string& entry, std::int32_t& id) {
 QFCAbstractFailurePatternPin::QFCAbstractFailurePatternPin(QFCAbstractFailurePattern* pattern)
     : QFCAbstractObjectData(std::string(), kKindPin, pattern),
       pattern_(pattern),
-      failureClassText_(QFCAbstractFailurePattern::ResourceText(kResNotConfigured)) {}
+      failureClassText_(ResourceText(kResNotConfigured)) {}
 
 QFCAbstractFailurePatternPin::~QFCAbstractFailurePatternPin() = default;
 
@@ -70,7 +71,7 @@ QFCAbstractFailureClasses* QFCAbstractFailurePatternPin::FailureClasses() const 
 
 std::string QFCAbstractFailurePatternPin::GetPinName() const {
   if (pin_ == nullptr) {
-    TheApp().ReportInternalFault(kPlacePinNameNoPin);
+    TheReporter().ReportInternalFault(kPlacePinNameNoPin);
     return {};
   }
   return pin_->PinName();
@@ -78,7 +79,7 @@ std::string QFCAbstractFailurePatternPin::GetPinName() const {
 
 std::string QFCAbstractFailurePatternPin::GetEcuName() const {
   if (pin_ == nullptr) {
-    TheApp().ReportInternalFault(kPlaceEcuNameNoPin);
+    TheReporter().ReportInternalFault(kPlaceEcuNameNoPin);
     return {};
   }
   return pin_->EcuName();
@@ -95,7 +96,7 @@ int QFCAbstractFailurePatternPin::GetDefinedFailureClassCount() const {
 HRESULT QFCAbstractFailurePatternPin::GetDefinedFailureClassId(int index,
                                                                std::int32_t& failureClassId) const {
   if (pin_ == nullptr) {
-    TheApp().ReportInternalFault(kPlaceDefinedIdNoPin);
+    TheReporter().ReportInternalFault(kPlaceDefinedIdNoPin);
     return E_FAULTBOX_NULL_POINTER;
   }
   pin_->EnsureFailureClasses();
@@ -120,7 +121,7 @@ bool QFCAbstractFailurePatternPin::GetDefinedFailureClasses(
   classes.clear();
   QFCAbstractFailureClasses* all = FailureClasses();
   if (pattern_ == nullptr || pin_ == nullptr || all == nullptr) {
-    TheApp().ReportInternalFault(kPlaceDefinedClassesInvalid);
+    TheReporter().ReportInternalFault(kPlaceDefinedClassesInvalid);
     return false;
   }
   pin_->EnsureFailureClasses();
@@ -134,7 +135,7 @@ bool QFCAbstractFailurePatternPin::GetDefinedFailureClasses(
 
 std::string QFCAbstractFailurePatternPin::GetRefusalReason() const {
   auto text = [](int id, std::initializer_list<std::string_view> args = {}) {
-    return QFCAbstractFailurePattern::ResourceText(id, args);
+    return ResourceText(id, args);
   };
   switch (refusal_) {
     case Refusal::kNone:
@@ -166,18 +167,18 @@ std::string QFCAbstractFailurePatternPin::GetRefusalReason() const {
 
 std::string QFCAbstractFailurePatternPin::GetNotReadyReason() const {
   if (IsReadyForActivation()) return {};
-  if (pin_ == nullptr || !IsFromPinFile()) return QFCAbstractFailurePattern::ResourceText(kResNotInPinFile);
+  if (pin_ == nullptr || !IsFromPinFile()) return ResourceText(kResNotInPinFile);
   if (!canBeActivated_) {
     std::string reason = GetRefusalReason();
-    return reason.empty() ? QFCAbstractFailurePattern::ResourceText(kResNoClass) : reason;
+    return reason.empty() ? ResourceText(kResNoClass) : reason;
   }
   const QFCECU* ecu = pin_->GetEcu();
   if (ecu == nullptr || !ecu->IsEnabled())
-    return QFCAbstractFailurePattern::ResourceText(kResEcuDisabled, {GetEcuName()});
+    return ResourceText(kResEcuDisabled, {GetEcuName()});
   std::uint32_t address = 0;
   char text[16] = "?";
   if (GetModuleAddress(address)) std::snprintf(text, sizeof text, "0x%03X", address);
-  return QFCAbstractFailurePattern::ResourceText(kResModuleSilent, {text});
+  return ResourceText(kResModuleSilent, {text});
 }
 
 bool QFCAbstractFailurePatternPin::IsReadyForActivation() const {
@@ -211,13 +212,13 @@ bool QFCAbstractFailurePatternPin::SetFailureClass(const std::vector<QFTFoundFai
   QFCAbstractFailureClass* failureClass =
       found.empty() || classes == nullptr ? nullptr : classes->FindById(found.front().failureClassId);
   if (failureClass == nullptr) {
-    TheApp().ReportInternalFault(kPlaceSetClassInvalid);
+    TheReporter().ReportInternalFault(kPlaceSetClassInvalid);
     return false;
   }
   failureClassId_ = found.front().failureClassId;
   relayVectorIndex_ = found.front().relayVectorIndex;
   failureClass->TryUse();
-  failureClassText_ = QFCAbstractFailurePattern::ResourceText(
+  failureClassText_ = ResourceText(
       kResClassTextFormat,
       {failureClass->GetName(), std::to_string(failureClassId_), std::to_string(relayVectorIndex_)});
   return true;
@@ -226,13 +227,13 @@ bool QFCAbstractFailurePatternPin::SetFailureClass(const std::vector<QFTFoundFai
 void QFCAbstractFailurePatternPin::ResetFailureClass() {
   failureClassId_ = -1;
   relayVectorIndex_ = -1;
-  failureClassText_ = QFCAbstractFailurePattern::ResourceText(kResNoFailureClass);
+  failureClassText_ = ResourceText(kResNoFailureClass);
 }
 
 QFCAbstractFailureClass* QFCAbstractFailurePatternPin::GetAdjustedFailureClass(
     std::int32_t& failureClassId, std::int32_t& relayVectorIndex) {
   if (pattern_ == nullptr) {
-    TheApp().ReportInternalFault(kPlaceAdjustedNoPattern);
+    TheReporter().ReportInternalFault(kPlaceAdjustedNoPattern);
     return nullptr;
   }
   if (failureClassId_ == -1 || relayVectorIndex_ == -1) return nullptr;
@@ -244,9 +245,9 @@ QFCAbstractFailureClass* QFCAbstractFailurePatternPin::GetAdjustedFailureClass(
     failureClass->SetSelectedPossibility(relayVectorIndex_);
     return failureClass;
   }
-  TheApp().ReportError(kMsgClassNotFound,
+  TheReporter().ReportError(kMsgClassNotFound,
                        std::to_string(failureClassId_) + "(" + std::to_string(relayVectorIndex_) + ")");
-  TheApp().ReportInternalFault(kPlaceAdjustedNotFound);
+  TheReporter().ReportInternalFault(kPlaceAdjustedNotFound);
   return nullptr;
 }
 
@@ -272,12 +273,12 @@ void QFCAbstractFailurePatternPin::GetPinConfig(std::uint32_t& e0, std::uint32_t
 
 bool QFCAbstractFailurePatternPin::SetPinConfig(int index, std::uint32_t value, bool updateViews) {
   if (pattern_ == nullptr) {
-    TheApp().ReportInternalFault(kPlaceSetPinConfigNoPattern);
+    TheReporter().ReportInternalFault(kPlaceSetPinConfigNoPattern);
     return false;
   }
   if (pattern_->IsReadOnly()) {
     QFCSystem* system = pattern_->GetOwnerSystem();
-    TheApp().ReportError(kMsgReadOnly, system ? system->GetName() : std::string());
+    TheReporter().ReportError(kMsgReadOnly, system ? system->GetName() : std::string());
     pattern_->UpdateViews();
     return false;
   }
@@ -285,7 +286,7 @@ bool QFCAbstractFailurePatternPin::SetPinConfig(int index, std::uint32_t value, 
   // IsPinConfigAllowed has vouched for the index; a platform that lets a
   // wider one through must not write past the entries.
   if (index < 0 || index >= kPinConfigEntries) {
-    TheApp().ReportInternalFault(kPlacePinConfigNotAllowed);
+    TheReporter().ReportInternalFault(kPlacePinConfigNotAllowed);
     return false;
   }
   pinConfig_[static_cast<std::size_t>(index)] = value & 0xFF;
@@ -298,7 +299,7 @@ bool QFCAbstractFailurePatternPin::ClearPinConfig() {
   if (pattern_ == nullptr) return false;
   if (pattern_->IsReadOnly()) {
     QFCSystem* system = pattern_->GetOwnerSystem();
-    TheApp().ReportError(kMsgReadOnly, system ? system->GetName() : std::string());
+    TheReporter().ReportError(kMsgReadOnly, system ? system->GetName() : std::string());
     return false;
   }
   // An activated pin's relays are on the hardware: its settings stay.

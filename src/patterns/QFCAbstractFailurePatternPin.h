@@ -9,7 +9,7 @@
 
 #include "config/QFCAbstractFailureClasses.h"
 #include "config/QFCAbstractObjectData.h"
-#include "host/ResultCodes.h"
+#include "platform/ResultCodes.h"
 
 namespace faultbox {
 
@@ -54,7 +54,7 @@ class QFCAbstractFailurePatternPin : public QFCAbstractObjectData {
   // The pin belongs to the current pin file (placeholders do not).
   bool IsFromPinFile() const;
   int GetDefinedFailureClassCount() const;
-  HRESULT GetDefinedFailureClassId(int index, std::int32_t& failureClassId) const;
+  [[nodiscard]] HRESULT GetDefinedFailureClassId(int index, std::int32_t& failureClassId) const;
   // The system's classes that the pin's entries name, in entry order.
   bool GetDefinedFailureClasses(std::vector<QFCAbstractFailureClass*>& classes) const;
   // Can be activated, its ECU is there and enabled, it is from the pin file

@@ -2,7 +2,7 @@
 #include "patterns/QFCAbstractFailurePatternSafetyInterlock.h"
 
 #include "config/QFCAbstractFailureClass.h"
-#include "host/QFCFaultboxApp.h"
+#include "platform/QFCReporter.h"
 #include "patterns/QFCAbstractFailurePattern.h"
 #include "patterns/QFCAbstractFailurePatternPin.h"
 #include "patterns/QFCFailurePatternPins.h"
@@ -30,7 +30,7 @@ void QFCAbstractFailurePatternSafetyInterlock::GetPossibleFailureClasses(
   QFCAbstractFailurePattern* pattern = GetPattern();
   const QFCAbstractFailureClasses* classes = pattern ? pattern->GetFailureClasses() : nullptr;
   if (pin == nullptr || classes == nullptr) {
-    TheApp().ReportInternalFault(kPlacePossibleInvalid);
+    TheReporter().ReportInternalFault(kPlacePossibleInvalid);
     return;
   }
   const auto& config = pin->GetPinConfig();
@@ -56,7 +56,7 @@ bool QFCAbstractFailurePatternSafetyInterlock::AdjustPinConfig(
   QFCAbstractFailurePattern* pattern = GetPattern();
   const QFCAbstractFailureClasses* classes = pattern ? pattern->GetFailureClasses() : nullptr;
   if (pin == nullptr || classes == nullptr) {
-    TheApp().ReportInternalFault(kPlaceAdjustInvalid);
+    TheReporter().ReportInternalFault(kPlaceAdjustInvalid);
     return false;
   }
   QFCAbstractFailurePatternPin::PinConfig config = pin->GetPinConfig();
@@ -68,7 +68,7 @@ bool QFCAbstractFailurePatternSafetyInterlock::AdjustPinConfig(
     const QFTPossibility* vector =
         failureClass ? failureClass->GetPossibility(candidate.relayVectorIndex) : nullptr;
     if (vector == nullptr) {
-      TheApp().ReportInternalFault(kPlaceAdjustMissing);
+      TheReporter().ReportInternalFault(kPlaceAdjustMissing);
       return false;
     }
     for (std::size_t k = 0; k < kEntries; ++k)
@@ -91,14 +91,14 @@ const QFCAbstractFailureClasses* QFCAbstractFailurePatternSafetyInterlock::Begin
   result = false;
   QFCAbstractFailurePattern* pattern = GetPattern();
   if (pattern == nullptr) {
-    TheApp().ReportInternalFault(placeNoPattern);
+    TheReporter().ReportInternalFault(placeNoPattern);
     return nullptr;
   }
   result = true;
   if (!pattern->IsInterlockEnabled()) return nullptr;
   const QFCAbstractFailureClasses* classes = pattern->GetFailureClasses();
   if (classes == nullptr) {
-    TheApp().ReportInternalFault(placeNoClasses);
+    TheReporter().ReportInternalFault(placeNoClasses);
     result = false;
   }
   return classes;
@@ -128,7 +128,7 @@ bool QFCAbstractFailurePatternSafetyInterlock::CheckPinSkeleton(QFCAbstractFailu
                                                                 const QFCAbstractFailureClasses* classes,
                                                                 std::vector<std::uint32_t>* requirement) {
   if (pin == nullptr || !IsPlatformPin(pin)) {
-    TheApp().ReportInternalFault(kPlaceCheckNotPlatformPin);
+    TheReporter().ReportInternalFault(kPlaceCheckNotPlatformPin);
     return false;
   }
   // A placeholder has no hardware behind it, and an activated pin's class is
@@ -144,7 +144,7 @@ bool QFCAbstractFailurePatternSafetyInterlock::CheckPinSkeleton(QFCAbstractFailu
   const std::size_t possible = candidates_.size();
   FilterCandidates(candidates_);
   if (!AdjustPinConfig(pin, candidates_)) {
-    TheApp().ReportInternalFault(kPlaceCheckAdjustFailed);
+    TheReporter().ReportInternalFault(kPlaceCheckAdjustFailed);
     return false;
   }
 
@@ -161,18 +161,18 @@ bool QFCAbstractFailurePatternSafetyInterlock::CheckPinSkeleton(QFCAbstractFailu
     ownRequirement_.assign(kRequirementPositions, 0);
     requirement = &ownRequirement_;
     if (!FillExternalRequirement(*requirement)) {
-      TheApp().ReportInternalFault(kPlaceCheckExternal);
+      TheReporter().ReportInternalFault(kPlaceCheckExternal);
       return false;
     }
   }
   QFCAbstractFailurePattern* pattern = GetPattern();
   if (pattern == nullptr || !pattern->FillRequirementVector(pin, *requirement)) {
-    TheApp().ReportInternalFault(kPlaceCheckRequirement);
+    TheReporter().ReportInternalFault(kPlaceCheckRequirement);
     return false;
   }
   if (classes == nullptr) classes = pattern->GetFailureClasses();
   if (classes == nullptr) {
-    TheApp().ReportInternalFault(kPlaceCheckNoClasses);
+    TheReporter().ReportInternalFault(kPlaceCheckNoClasses);
     return false;
   }
   if (IsRefusedByPlatformRule(pin, *requirement)) return true;

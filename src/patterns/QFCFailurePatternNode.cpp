@@ -1,5 +1,6 @@
 // The pattern folders: their tree, their pattern references and their record.
 #include "patterns/QFCFailurePatternNode.h"
+#include "platform/MessageTable.h"
 
 #include <algorithm>
 
@@ -25,7 +26,7 @@ QFCFailurePatternNode::QFCFailurePatternNode(QFCAbstractObjectData* system, QFCF
 QFCFailurePatternNode::~QFCFailurePatternNode() = default;
 
 std::string QFCFailurePatternNode::GetName() const {
-  if (IsRoot()) return QFCAbstractFailurePattern::ResourceText(kResRootName);
+  if (IsRoot()) return ResourceText(kResRootName);
   return name_;
 }
 

@@ -6,7 +6,7 @@
 
 #include "config/QFCAbstractPin.h"
 #include "config/QFCECU.h"
-#include "host/QFCFaultboxApp.h"
+#include "platform/QFCReporter.h"
 #include "patterns/QFCAbstractFailurePattern.h"
 #include "patterns/QFCAbstractFailurePatternPin.h"
 #include "platform/Archive.h"
@@ -77,7 +77,7 @@ bool QFCFailurePatternPins::AddPin(QFCAbstractPin* pin, QFCAbstractFailurePatter
                                    bool runInterlock) {
   out = nullptr;
   if (pin == nullptr || pattern_ == nullptr) {
-    TheApp().ReportInternalFault(kPlaceAddInvalidPin);
+    TheReporter().ReportInternalFault(kPlaceAddInvalidPin);
     return false;
   }
   // A placeholder's names are not known before its record is read.
@@ -90,7 +90,7 @@ bool QFCFailurePatternPins::AddPin(QFCAbstractPin* pin, QFCAbstractFailurePatter
   }
   std::unique_ptr<QFCAbstractFailurePatternPin> patternPin = pattern_->CreatePatternPin();
   if (!patternPin) {
-    TheApp().ReportInternalFault(kPlaceAddNoPatternPin);
+    TheReporter().ReportInternalFault(kPlaceAddNoPatternPin);
     return false;
   }
   patternPin->SetPin(pin);
@@ -108,11 +108,11 @@ bool QFCFailurePatternPins::RemovePins(const std::vector<QFCAbstractFailurePatte
     // Only this pattern's own pins can leave it; by identity, so that a pin
     // of another pattern never takes a namesake of this one with it.
     if (pin == nullptr || !Contains(pin)) {
-      TheApp().ReportInternalFault(kPlaceRemoveNotOurs);
+      TheReporter().ReportInternalFault(kPlaceRemoveNotOurs);
       continue;
     }
     if (pin->IsActivated()) {
-      TheApp().ReportWarning(kMsgActivatedStays, pin->GetPinName());
+      TheReporter().ReportWarning(kMsgActivatedStays, pin->GetPinName());
       continue;
     }
     going.insert(pin);
@@ -171,14 +171,14 @@ void QFCFailurePatternPins::Serialize(Archive& ar, int& lostPins) {
     if (pin == nullptr) {
       std::unique_ptr<QFCAbstractPin> placeholder = pattern_->CreatePlaceholderPin();
       if (!placeholder) {
-        TheApp().ReportInternalFault(kPlaceNoPlaceholder);
+        TheReporter().ReportInternalFault(kPlaceNoPlaceholder);
         throw ArchiveException(ArchiveCause::kGeneric, "no placeholder pin for a lost pin");
       }
       // Cleared so that the pin's record, read next, fills it completely.
       placeholder->SetCompareOnLoad(false);
       pin = placeholder.get();
       placeholders_.push_back(std::move(placeholder));
-      TheApp().ReportWarning(kMsgPinLost, "Pin name: " + pinName + ",ECU name: " + ecuName);
+      TheReporter().ReportWarning(kMsgPinLost, "Pin name: " + pinName + ",ECU name: " + ecuName);
       ++lostPins;
     }
     QFCAbstractFailurePatternPin* patternPin = nullptr;

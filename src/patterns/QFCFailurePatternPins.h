@@ -39,7 +39,6 @@ class QFCFailurePatternPins {
   QFCAbstractFailurePatternPin* GetAt(int index) const;
   int GetCount() const { return static_cast<int>(pins_.size()); }
   const std::vector<std::unique_ptr<QFCAbstractFailurePatternPin>>& GetList() const { return pins_; }
-  int GetPlaceholderCount() const { return static_cast<int>(placeholders_.size()); }
   bool Contains(const QFCAbstractFailurePatternPin* pin) const;
 
   // The pin collection record: count, then per pattern pin its names and

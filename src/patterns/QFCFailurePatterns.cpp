@@ -1,13 +1,14 @@
 // Creating, naming, finding, removing and storing the patterns of a system.
 #include "patterns/QFCFailurePatterns.h"
+#include "platform/MessageTable.h"
 
 #include "config/QFCAbstractHardwareInfo.h"
-#include "host/QFCFaultboxApp.h"
+#include "platform/QFCReporter.h"
 #include "patterns/QFCAbstractFailurePattern.h"
 #include "patterns/QFCFailurePatternNode.h"
 #include "patterns/QFCFailurePatternPins.h"
-#include "patterns/QFCKR40FailurePattern.h"
-#include "patterns/QFCKR60FailurePattern.h"
+#include "patterns/kr40/QFCKR40FailurePattern.h"
+#include "patterns/kr60/QFCKR60FailurePattern.h"
 #include "platform/Archive.h"
 #include "systems/QFCSystem.h"
 
@@ -49,7 +50,7 @@ std::string QFCFailurePatterns::MakeDefaultName() const {
   // Among count + 1 numbers one is always free.
   const int last = GetCount() + 1;
   for (int number = 1; number <= last; ++number) {
-    std::string name = QFCAbstractFailurePattern::ResourceText(kResDefaultName, {std::to_string(number)});
+    std::string name = ResourceText(kResDefaultName, {std::to_string(number)});
     if (!NameExists(name) || number == last) return name;
   }
   return {};
@@ -59,12 +60,12 @@ HRESULT QFCFailurePatterns::CreatePattern(QFCAbstractFailurePattern*& out, const
   out = nullptr;
   const std::string patternName = name.empty() ? MakeDefaultName() : name;
   if (NameExists(patternName)) {
-    TheApp().ReportInternal(kMsgNameNotUnique, patternName);
+    TheReporter().ReportInternal(kMsgNameNotUnique, patternName);
     return E_FAULTBOX_NAME_NOT_UNIQUE;
   }
   std::unique_ptr<QFCAbstractFailurePattern> pattern = NewPattern(GetPlatformType(), patternName);
   if (!pattern) {
-    TheApp().ReportInternalFault(kPlaceUnknownPlatform);
+    TheReporter().ReportInternalFault(kPlaceUnknownPlatform);
     return E_FAULTBOX;
   }
   pattern->SetCollection(this);
@@ -94,7 +95,7 @@ int QFCFailurePatterns::IndexOf(const QFCAbstractFailurePattern* pattern) const 
 
 bool QFCFailurePatterns::RemoveAt(int index) {
   if (index < 0 || index >= GetCount()) {
-    TheApp().ReportInternalFault(kPlaceRemoveIndex);
+    TheReporter().ReportInternalFault(kPlaceRemoveIndex);
     return false;
   }
   auto it = patterns_.begin() + index;
@@ -112,7 +113,7 @@ bool QFCFailurePatterns::RemoveAt(int index) {
 bool QFCFailurePatterns::RemovePattern(std::string_view name) {
   const int index = IndexOf(FindPattern(name));
   if (index < 0) {
-    TheApp().ReportInternalFault(kPlaceRemoveName);
+    TheReporter().ReportInternalFault(kPlaceRemoveName);
     return false;
   }
   const bool removed = RemoveAt(index);
@@ -122,11 +123,11 @@ bool QFCFailurePatterns::RemovePattern(std::string_view name) {
 
 bool QFCFailurePatterns::RenamePattern(QFCAbstractFailurePattern* pattern, const std::string& name) {
   if (pattern == nullptr || IndexOf(pattern) < 0) {
-    TheApp().ReportInternalFault(kPlaceRenameInvalid);
+    TheReporter().ReportInternalFault(kPlaceRenameInvalid);
     return false;
   }
   if (NameExists(name)) {
-    TheApp().ReportError(kMsgNameNotUnique, name);
+    TheReporter().ReportError(kMsgNameNotUnique, name);
     return false;
   }
   pattern->SetName(name);
@@ -173,7 +174,7 @@ void QFCFailurePatterns::Serialize(Archive& ar) {
     if (CreatePattern(pattern, "") != FAULTBOX_OK || pattern == nullptr) {
       // The record has no length: without a pattern to read it into, the
       // rest of the document cannot be found.
-      TheApp().ReportError(kMsgPatternNotCreated);
+      TheReporter().ReportError(kMsgPatternNotCreated);
       throw ArchiveException(ArchiveCause::kGeneric, "failure pattern could not be created");
     }
     pattern->Serialize(ar);

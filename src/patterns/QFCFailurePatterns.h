@@ -9,7 +9,7 @@
 #include <string_view>
 #include <vector>
 
-#include "host/ResultCodes.h"
+#include "platform/ResultCodes.h"
 
 namespace faultbox {
 
@@ -32,7 +32,7 @@ class QFCFailurePatterns {
 
   // A new pattern of the system's platform. An empty name takes the first
   // free default name; a name in use is refused (message 87, class 0).
-  HRESULT CreatePattern(QFCAbstractFailurePattern*& out, const std::string& name);
+  [[nodiscard]] HRESULT CreatePattern(QFCAbstractFailurePattern*& out, const std::string& name);
   // The default name format counted from 1: the first name no pattern bears.
   std::string MakeDefaultName() const;
   QFCAbstractFailurePattern* FindPattern(std::string_view name) const;
@@ -59,7 +59,7 @@ class QFCFailurePatterns {
   // The system's hardware reset after a failed transfer. Without one, the
   // patterns are only marked deactivated.
   void SetHardwareReset(HardwareReset reset) { hardwareReset_ = std::move(reset); }
-  HRESULT ResetHardware();
+  [[nodiscard]] HRESULT ResetHardware();
   void SetViewOpener(ViewOpener opener) { viewOpener_ = std::move(opener); }
   const ViewOpener& GetViewOpener() const { return viewOpener_; }
 

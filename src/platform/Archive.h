@@ -45,7 +45,6 @@ class Archive {
   explicit Archive(std::vector<std::uint8_t> input);
 
   bool IsStoring() const { return storing_; }
-  bool IsLoading() const { return !storing_; }
 
   // ---- storing ----
   void WriteU8(std::uint8_t value);

@@ -10,9 +10,9 @@
 #include <map>
 #include <set>
 
+#include "platform/InterfaceSettings.h"
 #include "platform/Text.h"
 #include "platform/can/CanDrivers.h"
-#include "systems/QFCSystemProperty.h"
 
 namespace faultbox {
 
@@ -20,8 +20,6 @@ namespace {
 
 constexpr std::uint32_t kDefaultQueueSize = 0x8000;
 constexpr std::uint32_t kMaxQueueSize = 1u << 20;
-constexpr std::uint8_t kDefaultBusTiming0 = 0x47;
-constexpr std::uint8_t kDefaultBusTiming1 = 0x14;
 constexpr std::uint32_t kAskInitAccess = 2;
 
 thread_local std::string tLastError;
@@ -29,19 +27,6 @@ thread_local std::string tLastError;
 CanResult Fail(const char* operation, CanResult result, const std::string& text) {
   tLastError = std::string(operation) + ": " + text;
   return result;
-}
-
-// ---- named events
-
-struct EventRegistry {
-  std::mutex mutex;
-  std::map<std::string, std::weak_ptr<NamedEvent>> events;
-};
-
-// Never destroyed: events may outlive every other static object.
-EventRegistry& Events() {
-  static EventRegistry* registry = new EventRegistry;
-  return *registry;
 }
 
 // ---- drivers
@@ -111,8 +96,8 @@ class Channel final : public CanFrameSink {
 // The timing of a bus without a controller of its own, shared by the
 // handles of this process on it.
 struct BusState {
-  std::uint8_t busTiming0 = kDefaultBusTiming0;
-  std::uint8_t busTiming1 = kDefaultBusTiming1;
+  std::uint8_t busTiming0 = kDefaultCanBusTiming0;
+  std::uint8_t busTiming1 = kDefaultCanBusTiming1;
   CanHandle initOwner = 0;
   int handles = 0;
 };
@@ -176,111 +161,10 @@ bool ValidIdentifier(const CanFrameRecord& f) {
 
 }  // namespace
 
-const char* CanResultText(CanResult result) {
-  switch (result) {
-    case CanResult::kOk:
-      return "success";
-    case CanResult::kInvalidHandle:
-      return "unknown handle";
-    case CanResult::kInvalidParameter:
-      return "invalid parameter";
-    case CanResult::kNoChannel:
-      return "no channel";
-    case CanResult::kNotActive:
-      return "channel not active";
-    case CanResult::kNoInitAccess:
-      return "no init access";
-    case CanResult::kNotSupported:
-      return "not supported";
-    case CanResult::kBusError:
-      return "bus error";
-  }
-  return "unknown result";
-}
-
-std::uint32_t CanBitRateFromBusTiming(std::uint8_t busTiming0, std::uint8_t busTiming1) {
-  constexpr std::uint32_t kClock = 16000000;
-  const std::uint32_t prescaler = (busTiming0 & 0x3Fu) + 1;
-  const std::uint32_t segment1 = (busTiming1 & 0x0Fu) + 1;
-  const std::uint32_t segment2 = ((busTiming1 >> 4) & 0x07u) + 1;
-  return kClock / (2 * prescaler * (1 + segment1 + segment2));
-}
-
 std::uint64_t CanTimeStampNow() {
   return static_cast<std::uint64_t>(std::chrono::duration_cast<std::chrono::microseconds>(
                                         std::chrono::system_clock::now().time_since_epoch())
                                         .count());
-}
-
-CanResult CanDriverChannel::ReadControllerBitRate(std::uint32_t* bitRate, std::string* error) {
-  *bitRate = 0;
-  *error = "the bus has no controller timing";
-  return CanResult::kNotSupported;
-}
-
-// ---------------------------------------------------------------- NamedEvent
-
-std::shared_ptr<NamedEvent> NamedEvent::Create(const std::string& name) {
-  EventRegistry& registry = Events();
-  std::lock_guard lock(registry.mutex);
-  auto it = registry.events.find(name);
-  if (it != registry.events.end() && !it->second.expired()) return nullptr;
-  std::shared_ptr<NamedEvent> event(new NamedEvent(name));
-  registry.events[name] = event;
-  return event;
-}
-
-std::shared_ptr<NamedEvent> NamedEvent::CreateFirstFree(std::string_view format) {
-  const std::size_t mark = format.find("%i");
-  if (mark == std::string_view::npos) return nullptr;
-  const std::string head(format.substr(0, mark));
-  const std::string tail(format.substr(mark + 2));
-  EventRegistry& registry = Events();
-  std::lock_guard lock(registry.mutex);
-  for (std::int64_t i = 0; i <= INT32_MAX; ++i) {
-    const std::string name = head + std::to_string(i) + tail;
-    auto it = registry.events.find(name);
-    if (it != registry.events.end() && !it->second.expired()) continue;
-    std::shared_ptr<NamedEvent> event(new NamedEvent(name));
-    registry.events[name] = event;
-    return event;
-  }
-  return nullptr;
-}
-
-std::shared_ptr<NamedEvent> NamedEvent::Open(const std::string& name) {
-  EventRegistry& registry = Events();
-  std::lock_guard lock(registry.mutex);
-  auto it = registry.events.find(name);
-  return it == registry.events.end() ? nullptr : it->second.lock();
-}
-
-NamedEvent::~NamedEvent() {
-  EventRegistry& registry = Events();
-  std::lock_guard lock(registry.mutex);
-  // The name may already belong to a newer event created after this one expired.
-  auto it = registry.events.find(name_);
-  if (it != registry.events.end() && it->second.expired()) registry.events.erase(it);
-}
-
-void NamedEvent::Set() {
-  {
-    std::lock_guard lock(mutex_);
-    signalled_ = true;
-  }
-  cv_.notify_one();
-}
-
-void NamedEvent::Reset() {
-  std::lock_guard lock(mutex_);
-  signalled_ = false;
-}
-
-NamedEvent::WaitResult NamedEvent::Wait(std::chrono::milliseconds timeout) {
-  std::unique_lock lock(mutex_);
-  if (!cv_.wait_for(lock, timeout, [this] { return signalled_; })) return WaitResult::kTimedOut;
-  signalled_ = false;
-  return WaitResult::kSignalled;
 }
 
 // ---------------------------------------------------------------- operations

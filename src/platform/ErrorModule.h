@@ -8,7 +8,7 @@
 #include <string>
 #include <vector>
 
-#include "host/ResultCodes.h"
+#include "platform/ResultCodes.h"
 
 namespace faultbox {
 
@@ -38,8 +38,6 @@ class ErrorModule {
 
   bool Create(int mainModule, int first, int second, void* hostDispatch, const std::string& componentName);
   void Destroy();
-  int MainModule() const { return mainModule_; }
-  const std::string& ComponentName() const { return componentName_; }
 
   // Pushes a record and returns its handle (never 0).
   int SetError(int errorClass, int dialogKind, int number, const std::string& first, const std::string& second);

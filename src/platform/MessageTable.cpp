@@ -383,4 +383,22 @@ std::vector<int> KnownResourceStringIds() {
   return Numbers(kStrings);
 }
 
+std::string ResourceText(int id, std::initializer_list<std::string_view> args) {
+  const char* format = ResourceString(id);
+  std::string text = format ? format : std::to_string(id);
+  std::string out;
+  auto next = args.begin();
+  for (std::size_t i = 0; i < text.size(); ++i) {
+    const bool placeholder = text[i] == '%' && i + 1 < text.size() &&
+                             (text[i + 1] == 's' || text[i + 1] == 'd' || text[i + 1] == 'i');
+    if (placeholder && next != args.end()) {
+      out += *next++;
+      ++i;
+    } else {
+      out += text[i];
+    }
+  }
+  return out;
+}
+
 }  // namespace faultbox

@@ -2,6 +2,7 @@
 // wording of everything the component reports or shows by number.
 #pragma once
 
+#include <initializer_list>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -18,6 +19,10 @@ std::string FormatMessage(int number, std::string_view first, std::string_view s
 
 // A numbered resource string (labels, default names, formats); nullptr when unknown.
 const char* ResourceString(int id);
+
+// A numbered resource string with its %s / %d / %i placeholders filled in
+// order. Filled by hand: the format comes from a table, never from printf.
+std::string ResourceText(int id, std::initializer_list<std::string_view> args = {});
 
 // Every number that has a text, in ascending order (for completeness tests and --help listings).
 std::vector<int> KnownMessageNumbers();

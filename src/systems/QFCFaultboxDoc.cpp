@@ -6,8 +6,8 @@
 #include <unistd.h>
 
 #include "config/QFCAbstractHardwareInfo.h"
-#include "config/QFCKR40HardwareInfo.h"
-#include "host/QFCFaultboxApp.h"
+#include "config/kr40/QFCKR40HardwareInfo.h"
+#include "platform/QFCReporter.h"
 #include "patterns/QFCAbstractFailurePattern.h"
 #include "patterns/QFCFailurePatterns.h"
 #include "platform/Archive.h"
@@ -132,7 +132,7 @@ bool QFCFaultboxDoc::OnNewDocument(const std::string& pinFile, std::int32_t ecuV
   // A new document has no folder of its own to look for its pin file in.
   archivePath_.clear();
   if (CreateSystem(pinFile, ecuVersion, author, description) != FAULTBOX_OK) return false;
-  TheApp().ReportInfo(kMsgDocumentCreated, system_->GetName());
+  TheReporter().ReportInfo(kMsgDocumentCreated, system_->GetName());
   system_->SetModified();
   return true;
 }
@@ -144,13 +144,13 @@ bool QFCFaultboxDoc::OnOpenDocument(const std::string& path) {
   struct stat st {};
   const std::string native = QFCFileHelper::ToNative(full);
   if (::stat(native.c_str(), &st) == 0 && !S_ISREG(st.st_mode)) {
-    TheApp().ReportInfo(kMsgLoadingStarts);
+    TheReporter().ReportInfo(kMsgLoadingStarts);
     ReportSaveLoadException(full, "not a regular file: " + full);
     return false;
   }
   const auto bytes = ReadWholeFile(native, &error);
   if (!bytes) {
-    TheApp().ReportInfo(kMsgLoadingStarts);
+    TheReporter().ReportInfo(kMsgLoadingStarts);
     ReportSaveLoadException(full, error);
     return false;
   }
@@ -162,17 +162,17 @@ bool QFCFaultboxDoc::OpenFromBytes(const std::string& path, const std::vector<st
 }
 
 bool QFCFaultboxDoc::Load(const std::string& path, const std::vector<std::uint8_t>& bytes) {
-  TheApp().ReportInfo(kMsgLoadingStarts);
+  TheReporter().ReportInfo(kMsgLoadingStarts);
   alreadyOpen_ = nullptr;
   if (system_ != nullptr) {
     // One document, one system: a second load would orphan the first.
-    TheApp().ReportInternalFault(kPlaceSecondSystem);
+    TheReporter().ReportInternalFault(kPlaceSecondSystem);
     return false;
   }
   // A file of no document kind is not read at all: its first bytes would
   // only be taken for a file version.
   if (platform_ != fptKR40Platform && platform_ != fptKR60Platform) {
-    TheApp().ReportError(kMsgWrongBoardType, path, {}, kShown);
+    TheReporter().ReportError(kMsgWrongBoardType, path, {}, kShown);
     return false;
   }
   if (!pinFileReplacement_.empty()) changedOnLoad_ = true;
@@ -203,7 +203,7 @@ bool QFCFaultboxDoc::Load(const std::string& path, const std::vector<std::uint8_
   // whether the file no longer says what the system now holds.
   system_->ClearModified();
   if (changedOnLoad_) system_->SetModified();
-  TheApp().ReportInfo(kMsgLoadingEnded);
+  TheReporter().ReportInfo(kMsgLoadingEnded);
   return true;
 }
 
@@ -220,7 +220,7 @@ void QFCFaultboxDoc::Serialize(Archive& ar) {
 
 void QFCFaultboxDoc::Store(Archive& ar) {
   if (system_ == nullptr) {
-    TheApp().ReportInternalFault(kPlaceNoSystemToSave);
+    TheReporter().ReportInternalFault(kPlaceNoSystemToSave);
     throw ArchiveException(ArchiveCause::kGeneric, "no system to store");
   }
   ar.WriteU32(kFileVersion);
@@ -236,7 +236,7 @@ void QFCFaultboxDoc::Store(Archive& ar) {
 void QFCFaultboxDoc::LoadFrom(Archive& ar) {
   const std::uint32_t version = ar.ReadU32();
   if (version > kFileVersion) {
-    TheApp().ReportError(kMsgNewerVersion, archivePath_, std::to_string(version), kShown);
+    TheReporter().ReportError(kMsgNewerVersion, archivePath_, std::to_string(version), kShown);
     throw ArchiveException(ArchiveCause::kGeneric, "file version " + std::to_string(version));
   }
   // The stored name is the document's own path at saving; the document's
@@ -254,17 +254,17 @@ void QFCFaultboxDoc::LoadFrom(Archive& ar) {
     throw ArchiveException(ArchiveCause::kGeneric, "no system for the pin file " + pinFile);
   }
   if (system_ == nullptr) {
-    TheApp().ReportInternalFault(kPlaceNoSystemAfterCreate);
+    TheReporter().ReportInternalFault(kPlaceNoSystemAfterCreate);
     throw ArchiveException(ArchiveCause::kGeneric, "no system");
   }
 
   system_->Serialize(ar);
   if (system_->IsChanged()) {
-    TheApp().ReportWarning(kMsgDifferentFromPinFile, {}, {}, kShown);
+    TheReporter().ReportWarning(kMsgDifferentFromPinFile, {}, {}, kShown);
     changedOnLoad_ = true;
   }
   system_->SetName(archivePath_);
-  TheApp().ReportInfo(kMsgSystemLoaded, system_->GetName());
+  TheReporter().ReportInfo(kMsgSystemLoaded, system_->GetName());
   system_->UpdateViews();
 }
 
@@ -280,16 +280,16 @@ std::vector<std::uint8_t> QFCFaultboxDoc::StoreToBytes(const std::string& path) 
 bool QFCFaultboxDoc::OnSaveDocument(const std::string& path) {
   const std::string full = Absolute(path);
   if (system_ == nullptr) {
-    TheApp().ReportInternalFault(kPlaceNoSystemToSave);
+    TheReporter().ReportInternalFault(kPlaceNoSystemToSave);
     return false;
   }
   // A file of the other kind could never be opened again as what it holds.
   if (PlatformOfPath(full) != platform_) {
-    TheApp().ReportError(kMsgWrongBoardType, full, {}, kShown);
+    TheReporter().ReportError(kMsgWrongBoardType, full, {}, kShown);
     return false;
   }
   if (QFCFileHelper::Exists(full) && QFCFileHelper::IsWriteProtected(full)) {
-    TheApp().ReportError(kMsgReadOnly, full);
+    TheReporter().ReportError(kMsgReadOnly, full);
     return false;
   }
   const std::string oldName = system_->GetName();
@@ -320,7 +320,7 @@ bool QFCFaultboxDoc::OnCloseDocument() {
   if (system_ == nullptr) return true;
   QFCAbstractFailurePattern* activated = nullptr;
   if (system_->HasActivatedPattern(activated)) {
-    TheApp().ReportError(kMsgActivatedPattern, system_->GetName(), {}, kShown);
+    TheReporter().ReportError(kMsgActivatedPattern, system_->GetName(), {}, kShown);
     return false;
   }
   const std::string name = system_->GetName();
@@ -338,7 +338,7 @@ void QFCFaultboxDoc::ReportSaveLoadException(const std::string& path, const Arch
 }
 
 void QFCFaultboxDoc::ReportSaveLoadException(const std::string& path, const std::string& fileError) {
-  TheApp().ReportError(kMsgSaveLoadFailed, fileError + "\n" + path, {}, kShown);
+  TheReporter().ReportError(kMsgSaveLoadFailed, fileError + "\n" + path, {}, kShown);
 }
 
 // ---- the system ----
@@ -347,16 +347,16 @@ std::string QFCFaultboxDoc::FindPinFile(const std::string& pinFile) {
   std::string path = pinFile;
   if (!pinFileReplacement_.empty()) {
     const std::string replacement = Absolute(pinFileReplacement_);
-    TheApp().ReportWarning(kMsgOtherPinFile, replacement, path);
+    TheReporter().ReportWarning(kMsgOtherPinFile, replacement, path);
     path = replacement;
     pinFileReplacement_.clear();
     changedOnLoad_ = true;
   }
   if (IsUsable(path)) return path;
-  TheApp().ReportError(kMsgFileUnusable, path);
+  TheReporter().ReportError(kMsgFileUnusable, path);
 
   auto use = [&](const std::string& found) {
-    TheApp().ReportWarning(kMsgOtherPinFile, found, path);
+    TheReporter().ReportWarning(kMsgOtherPinFile, found, path);
     changedOnLoad_ = true;
     return found;
   };
@@ -372,7 +372,7 @@ std::string QFCFaultboxDoc::FindPinFile(const std::string& pinFile) {
         !found.empty() && IsUsable(found))
       return use(found);
     // Nobody can be asked for the file: name every place that was tried.
-    TheApp().ReportError(kMsgFileUnusable, candidate);
+    TheReporter().ReportError(kMsgFileUnusable, candidate);
   }
   return {};
 }
@@ -380,30 +380,30 @@ std::string QFCFaultboxDoc::FindPinFile(const std::string& pinFile) {
 void QFCFaultboxDoc::ReportOpenFailure(HRESULT result) {
   if (result == E_FAULTBOX_CANN_NOT_OPEN_FILE || result == E_FAULTBOX_NAME_NOT_UNIQUE ||
       result == E_FAULTBOX_TAG_NOT_FOUND || result == E_FAULTBOX_FILE_IS_NOT_OPENED) {
-    TheApp().ReportError(kMsgCannotOpenSystem);
+    TheReporter().ReportError(kMsgCannotOpenSystem);
   } else if (result == E_FAULTBOX_HEADER_COL_NOT_FOUND || result == E_FAULTBOX_CONSISTENCY_CHECK ||
              result == E_FAULTBOX_INVALID_PARAMETER || result == E_FAULTBOX_BOARD_TYPE_IS_NOT_SUPORTED) {
-    TheApp().ReportError(kMsgInconsistentPinFile);
+    TheReporter().ReportError(kMsgInconsistentPinFile);
   } else {
-    TheApp().ReportInternalFault(kPlaceOpenFailed);
+    TheReporter().ReportInternalFault(kPlaceOpenFailed);
   }
 }
 
 HRESULT QFCFaultboxDoc::CreateSystem(const std::string& pinFile, std::int32_t ecuVersion,
                                      const std::string& author, const std::string& description) {
   if (system_ != nullptr) {
-    TheApp().ReportInternalFault(kPlaceSecondSystem);
+    TheReporter().ReportInternalFault(kPlaceSecondSystem);
     return E_FAULTBOX;
   }
   // A document of no kind can hold no system; saying so before any file is
   // read spares the user the messages of a pin file that is not the problem.
   if (platform_ != fptKR40Platform && platform_ != fptKR60Platform) {
-    TheApp().ReportError(kMsgWrongBoardType, ExpectedBoardTypes(platform_), {}, kShown);
+    TheReporter().ReportError(kMsgWrongBoardType, ExpectedBoardTypes(platform_), {}, kShown);
     return E_FAULTBOX_BOARD_TYPE_IS_NOT_SUPORTED;
   }
   const std::string path = FindPinFile(Absolute(pinFile));
   if (path.empty()) {
-    TheApp().ReportError(kMsgCannotOpenSystem);
+    TheReporter().ReportError(kMsgCannotOpenSystem);
     return E_FAULTBOX_CANN_NOT_OPEN_FILE;
   }
 
@@ -418,7 +418,7 @@ HRESULT QFCFaultboxDoc::CreateSystem(const std::string& pinFile, std::int32_t ec
     return result;
   }
   if (found != platform_) {
-    TheApp().ReportError(kMsgWrongBoardType, ExpectedBoardTypes(platform_), {}, kShown);
+    TheReporter().ReportError(kMsgWrongBoardType, ExpectedBoardTypes(platform_), {}, kShown);
     return E_FAULTBOX_BOARD_TYPE_IS_NOT_SUPORTED;
   }
 

@@ -8,7 +8,7 @@
 #include <string>
 #include <vector>
 
-#include "host/ResultCodes.h"
+#include "platform/ResultCodes.h"
 
 namespace faultbox {
 
@@ -66,7 +66,7 @@ class QFCFaultboxDoc {
   // Finds the pin file (replacement path, then the document's folder), checks
   // that its board type suits the document kind (message 49) and opens the
   // system in the administration (messages 83, 84).
-  HRESULT CreateSystem(const std::string& pinFile, std::int32_t ecuVersion, const std::string& author,
+  [[nodiscard]] HRESULT CreateSystem(const std::string& pinFile, std::int32_t ecuVersion, const std::string& author,
                        const std::string& description);
 
   QFCSystem* GetSystem() const { return system_; }

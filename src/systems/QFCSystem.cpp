@@ -11,9 +11,10 @@
 #include "config/QFCAbstractFailureClasses.h"
 #include "config/QFCECU.h"
 #include "config/QFCFSHelper.h"
-#include "config/QFCKR40HardwareInfo.h"
-#include "config/QFCKR60HardwareInfo.h"
-#include "host/QFCFaultboxApp.h"
+#include "config/kr40/QFCKR40HardwareInfo.h"
+#include "config/kr60/QFCKR60HardwareInfo.h"
+#include "platform/QFCReporter.h"
+#include "platform/UserMode.h"
 #include "patterns/QFCAbstractFailurePattern.h"
 #include "patterns/QFCFailurePatternNode.h"
 #include "patterns/QFCFailurePatterns.h"
@@ -131,7 +132,7 @@ HRESULT QFCSystem::OpenFromPinFile() {
   HRESULT result = FAULTBOX_OK;
   std::unique_ptr<QFCAbstractHardwareInfo> main = CreateHardwareInfo(pinFilePath_, platformType_, result);
   if (!main) {
-    if (result == E_FAULTBOX_NULL_POINTER) TheApp().ReportInternalFault(kPlaceNoHardwareInfo);
+    if (result == E_FAULTBOX_NULL_POINTER) TheReporter().ReportInternalFault(kPlaceNoHardwareInfo);
     return result;
   }
   if ((result = main->LoadPinFile(false)) != FAULTBOX_OK) return result;
@@ -149,12 +150,12 @@ HRESULT QFCSystem::OpenFromPinFile() {
     std::int32_t platform = 0;
     std::unique_ptr<QFCAbstractHardwareInfo> info = CreateHardwareInfo(path, platform, result);
     if (!info) {
-      if (result == E_FAULTBOX_NULL_POINTER) TheApp().ReportInternalFault(kPlaceNoAdditionalHardwareInfo);
+      if (result == E_FAULTBOX_NULL_POINTER) TheReporter().ReportInternalFault(kPlaceNoAdditionalHardwareInfo);
       return result;
     }
     if ((result = info->LoadPinFile(true)) != FAULTBOX_OK) return result;
     if (platform != platformType_) {
-      TheApp().ReportInternal(kMsgAdditionalFilePlatform, name);
+      TheReporter().ReportInternal(kMsgAdditionalFilePlatform, name);
       return E_FAULTBOX_CONSISTENCY_CHECK;
     }
     RegisterColumns(*info);
@@ -180,7 +181,7 @@ HRESULT QFCSystem::ReadPlatformConfiguration(const QFCAbstractHardwareInfo& info
   if (std::int32_t platform = PlatformOfBoardType(boardType); platform != 0) {
     platformType_ = platform;
   } else if (platformType_ != fptKR40Platform && platformType_ != fptKR60Platform) {
-    TheApp().ReportInternalFault(kPlaceUnknownPlatform);
+    TheReporter().ReportInternalFault(kPlaceUnknownPlatform);
     return E_FAULTBOX;
   }
   return platformType_ == fptKR40Platform ? ReadKR40Configuration(info) : ReadKR60Configuration(info);
@@ -199,14 +200,14 @@ HRESULT QFCSystem::ReadKR60Configuration(const QFCAbstractHardwareInfo& info) {
     const std::string key = "Potential" + std::to_string(i);
     std::string value;
     if (HRESULT result = info.GetFormatValue(key, value); result != FAULTBOX_OK) {
-      TheApp().ReportError(kMsgPotentialMissing, key, pinFileTitle_);
+      TheReporter().ReportError(kMsgPotentialMissing, key, pinFileTitle_);
       return result;
     }
     // Any number of potentials may be absent ("none"); a named one must be unique.
     if (value != "none") {
       for (const std::string& earlier : potentialNames_) {
         if (earlier == value) {
-          TheApp().ReportError(kMsgPotentialTwice, value);
+          TheReporter().ReportError(kMsgPotentialTwice, value);
           return E_FAULTBOX_CONSISTENCY_CHECK;
         }
       }
@@ -273,7 +274,7 @@ HRESULT QFCSystem::GetLoadAddress(const std::string& key, std::uint32_t& address
     }
   }
   if (!found) {
-    TheApp().ReportInternal(kMsgInvalidValue, key, detail);
+    TheReporter().ReportInternal(kMsgInvalidValue, key, detail);
     return E_FAULTBOX_INVALID_PARAMETER;
   }
   return FAULTBOX_OK;
@@ -281,7 +282,7 @@ HRESULT QFCSystem::GetLoadAddress(const std::string& key, std::uint32_t& address
 
 QFCECU* QFCSystem::GetECU(int index) const {
   if (index < 0 || index >= GetECUCount()) {
-    TheApp().ReportInternalFault(kPlaceEcuIndex);
+    TheReporter().ReportInternalFault(kPlaceEcuIndex);
     return nullptr;
   }
   return ecus_[static_cast<std::size_t>(index)];
@@ -295,7 +296,7 @@ void QFCSystem::GetProperties(PropertyTable& table) const {
   table[Resource(kLabelDescription)] = description_;
   table[Resource(kLabelPinFile)] = pinFilePath_;
   table[Resource(kLabelUserMode)] =
-      Resource(TheApp().GetUserMode() == 2 ? kTextServiceMode : kTextStandardMode);
+      Resource(GetUserMode() == 2 ? kTextServiceMode : kTextStandardMode);
 }
 
 // ---- owner chain ----
@@ -312,7 +313,7 @@ void QFCSystem::SetModified() {
 
 bool QFCSystem::CheckWritable() const {
   if (!IsReadOnly()) return true;
-  TheApp().ReportError(kMsgReadOnly, GetName());
+  TheReporter().ReportError(kMsgReadOnly, GetName());
   return false;
 }
 
@@ -391,7 +392,7 @@ bool QFCSystem::RemovePattern(std::string_view name) {
   if (!CheckWritable()) return false;
   if (QFCAbstractFailurePattern* pattern = FindPattern(name);
       pattern != nullptr && pattern->IsAnyPinActivated()) {
-    TheApp().ReportError(kMsgPatternActivated);
+    TheReporter().ReportError(kMsgPatternActivated);
     return false;
   }
   return patterns_->RemovePattern(name);
@@ -424,7 +425,7 @@ std::string QFCSystem::GetPinFileBoardType() const {
   // Only the KR40 family keeps the board type; KR60 leaves it in the pin file.
   if (!boardType_.empty() || hardwareInfos_.empty()) return boardType_;
   std::string value;
-  hardwareInfos_.front()->GetFormatValue("BoardType", value);
+  if (hardwareInfos_.front()->GetFormatValue("BoardType", value) != FAULTBOX_OK) value.clear();
   return value;
 }
 

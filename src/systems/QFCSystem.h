@@ -42,13 +42,13 @@ class QFCSystem : public QFCSystemProperty {
   // configuration and failure classes, collects the ECUs and creates the
   // transfer interface. A failure leaves a half-built system that the caller
   // deletes.
-  HRESULT OpenFromPinFile();
+  [[nodiscard]] HRESULT OpenFromPinFile();
 
   // "FIULoadAddress", "RSIMLoadAddress" or "OffsetLoadAddress" of the pin
   // file as a number. A module that is not fitted ("none", "-", "#"), a value
   // that cannot be read and any other key fail with message 37 and
   // E_FAULTBOX_INVALID_PARAMETER.
-  HRESULT GetLoadAddress(const std::string& key, std::uint32_t& address) const;
+  [[nodiscard]] HRESULT GetLoadAddress(const std::string& key, std::uint32_t& address) const;
 
   // The ECUs of all pin files, in pin file order. GetECU gives nullptr and an
   // internal fault for an index outside 0 ... count-1.
@@ -88,11 +88,11 @@ class QFCSystem : public QFCSystemProperty {
   // activated, and both are refused while another system on the same HIL
   // simulator is connected. A failed connect leaves the system disconnected
   // with every pin unavailable.
-  HRESULT SetConnection(bool connect, bool report);
+  [[nodiscard]] HRESULT SetConnection(bool connect, bool report);
   // Sends the reset messages to all modules, learns which modules answer and
   // marks every pattern deactivated. Modules that stay silent are reported but
   // do not fail the reset.
-  HRESULT ResetHardware();
+  [[nodiscard]] HRESULT ResetHardware();
   // A pin is available when its module answered the last reset.
   void UpdatePinAvailability();
   // The administration asked for other systems on the same HIL simulator; a
@@ -107,7 +107,7 @@ class QFCSystem : public QFCSystemProperty {
   // Each is refused with message 118 naming the system while the document is
   // write-protected; the collection's own checks (unique names, message 87)
   // follow. A successful change marks the document modified.
-  HRESULT CreatePattern(const std::string& name, QFCAbstractFailurePattern*& pattern);
+  [[nodiscard]] HRESULT CreatePattern(const std::string& name, QFCAbstractFailurePattern*& pattern);
   // A pattern with an activated pin stays (message 127): its relays would be
   // left switched with nothing to switch them back.
   bool RemovePattern(std::string_view name);
@@ -127,8 +127,6 @@ class QFCSystem : public QFCSystemProperty {
   bool IsModified() const { return modified_; }
   void ClearModified() { modified_ = false; }
 
-  // The path of the document file that holds the system ("" until saved or loaded).
-  const std::string& GetDocumentPath() const { return documentPath_; }
   void SetDocumentPath(std::string path) { documentPath_ = std::move(path); }
 
   // ---- properties ----
@@ -158,10 +156,10 @@ class QFCSystem : public QFCSystemProperty {
   // board type cannot be read or names no platform.
   std::unique_ptr<QFCAbstractHardwareInfo> CreateHardwareInfo(const std::string& path, std::int32_t& platform,
                                                               HRESULT& result);
-  HRESULT ReadPlatformConfiguration(const QFCAbstractHardwareInfo& info);
-  HRESULT ReadKR40Configuration(const QFCAbstractHardwareInfo& info);
-  HRESULT ReadKR60Configuration(const QFCAbstractHardwareInfo& info);
-  HRESULT LoadSystemFailureClasses();
+  [[nodiscard]] HRESULT ReadPlatformConfiguration(const QFCAbstractHardwareInfo& info);
+  [[nodiscard]] HRESULT ReadKR40Configuration(const QFCAbstractHardwareInfo& info);
+  [[nodiscard]] HRESULT ReadKR60Configuration(const QFCAbstractHardwareInfo& info);
+  [[nodiscard]] HRESULT LoadSystemFailureClasses();
   // Adds the description's columns to the visible pin properties, keeping the flags of known ones.
   void RegisterColumns(const QFCAbstractHardwareInfo& info);
   bool CheckWritable() const;
@@ -174,8 +172,8 @@ class QFCSystem : public QFCSystemProperty {
   void EnterDisconnectedState();
   // The platform parts of ResetHardware; `completed` is false when a send
   // failed and the reset ended early.
-  HRESULT ResetKR60Hardware(bool& completed);
-  HRESULT ResetKR40Hardware(bool& completed);
+  [[nodiscard]] HRESULT ResetKR60Hardware(bool& completed);
+  [[nodiscard]] HRESULT ResetKR40Hardware(bool& completed);
 
   std::vector<std::unique_ptr<QFCAbstractHardwareInfo>> hardwareInfos_;
   std::vector<QFCECU*> ecus_;  // owned by the hardware descriptions

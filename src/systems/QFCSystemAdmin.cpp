@@ -4,7 +4,7 @@
 #include "patterns/QFCAbstractFailurePattern.h"
 
 #include "config/QFCFSHelper.h"
-#include "host/QFCFaultboxApp.h"
+#include "platform/QFCReporter.h"
 #include "platform/FileHelper.h"
 #include "platform/MessageTable.h"
 #include "systems/QFCSystem.h"
@@ -91,7 +91,7 @@ QFCSystem* QFCSystemAdmin::GetAt(int index) const {
 void QFCSystemAdmin::Remove(const std::string& name) {
   for (auto it = systems_.begin(); it != systems_.end(); ++it) {
     if (!SameName((*it)->GetName(), name)) continue;
-    TheApp().ReportInfo(kMsgSystemClosed, (*it)->GetName());
+    TheReporter().ReportInfo(kMsgSystemClosed, (*it)->GetName());
     // Destroying the system disconnects it without reports.
     systems_.erase(it);
     return;
@@ -108,11 +108,11 @@ void QFCSystemAdmin::Discard(const QFCSystem* system) {
 
 bool QFCSystemAdmin::Rename(QFCSystem* system, const std::string& newName) {
   if (system == nullptr) {
-    TheApp().ReportInternalFault(kPlaceRenameInvalid);
+    TheReporter().ReportInternalFault(kPlaceRenameInvalid);
     return false;
   }
   if (IsNameUsed(newName, system)) {
-    TheApp().ReportError(kMsgNameUsed, newName);
+    TheReporter().ReportError(kMsgNameUsed, newName);
     return false;
   }
   system->SetName(newName);
@@ -121,7 +121,7 @@ bool QFCSystemAdmin::Rename(QFCSystem* system, const std::string& newName) {
 
 QFCSystem* QFCSystemAdmin::FindOtherSystemOnSameHil(const QFCSystem* system) const {
   if (system == nullptr) {
-    TheApp().ReportInternalFault(kPlaceSameHilInvalid);
+    TheReporter().ReportInternalFault(kPlaceSameHilInvalid);
     return nullptr;
   }
   if (system->GetPlatformType() == 1) return nullptr;
@@ -145,14 +145,17 @@ void QFCSystemAdmin::GetConnectedSystems(std::vector<QFCSystem*>& systems) const
     if (system->IsConnected()) systems.push_back(system.get());
 }
 
-void QFCSystemAdmin::DeactivateAll() {
+HRESULT QFCSystemAdmin::DeactivateAll() {
+  HRESULT first = FAULTBOX_OK;
   for (const auto& system : systems_) {
     QFCAbstractFailurePattern* pattern = nullptr;
     if (!system->HasActivatedPattern(pattern) || pattern == nullptr) continue;
     pattern->SelectAllPins(true);
-    pattern->ActivatePattern(false);
+    const HRESULT result = pattern->ActivatePattern(false);
     pattern->SelectAllPins(false);
+    if (result != FAULTBOX_OK && first == FAULTBOX_OK) first = result;
   }
+  return first;
 }
 
 }  // namespace faultbox

@@ -8,7 +8,7 @@
 #include <string_view>
 #include <vector>
 
-#include "host/ResultCodes.h"
+#include "platform/ResultCodes.h"
 
 namespace faultbox {
 
@@ -24,7 +24,7 @@ class QFCSystemAdmin {
   // Creates a system under the first free default name, opens it from the pin
   // file and keeps it. On failure the system is deleted, `system` is nullptr
   // and the administration is unchanged.
-  HRESULT Open(const std::string& pinFile, std::int32_t ecuVersion, const std::string& author,
+  [[nodiscard]] HRESULT Open(const std::string& pinFile, std::int32_t ecuVersion, const std::string& author,
                const std::string& description, QFCSystem*& system);
   // The first default name ("System 1", "System 2", ...) that no system bears.
   std::string GetDefaultName() const;
@@ -53,8 +53,9 @@ class QFCSystemAdmin {
   // systems never share a simulator.
   QFCSystem* FindOtherSystemOnSameHil(const QFCSystem* system) const;
   // Deactivates the activated pattern of every system: all its pins take part
-  // in the deactivation and are deselected afterwards.
-  void DeactivateAll();
+  // in the deactivation and are deselected afterwards. Every system is tried;
+  // the result is the first failure, so a caller knows a relay may still be on.
+  [[nodiscard]] HRESULT DeactivateAll();
   // Appends every connected system, in the order of creation.
   void GetConnectedSystems(std::vector<QFCSystem*>& systems) const;
 

@@ -5,15 +5,16 @@
 #include <limits>
 #include <thread>
 
-#include "comm/QFCCANMessageBuilder.h"
 #include "comm/QFCCANTransferInterface.h"
-#include "comm/QFCSerielleMessageBuilder.h"
 #include "comm/QFCSerielleTransferInterface.h"
 #include "config/QFCAbstractHardwareInfo.h"
 #include "config/QFCAbstractPin.h"
 #include "config/QFCECU.h"
-#include "host/QFCFaultboxApp.h"
+#include "config/QFCFSHelper.h"
 #include "patterns/QFCFailurePatterns.h"
+#include "patterns/kr40/QFCSerielleMessageBuilder.h"
+#include "patterns/kr60/QFCCANMessageBuilder.h"
+#include "platform/QFCReporter.h"
 #include "platform/Settings.h"
 #include "systems/QFCSystem.h"
 #include "systems/QFCSystemAdmin.h"
@@ -66,7 +67,8 @@ std::string HexAddress(std::uint32_t address) {
 }  // namespace
 
 std::int32_t QFCSystem::GetResetCollectionWait() {
-  return ReadCountSetting(Settings::kHardwareSection, kResetCollectionWaitKey, kDefaultResetCollectionWait);
+  return QFCFSHelper::ReadCountSetting(Settings::kHardwareSection, kResetCollectionWaitKey,
+                                       kDefaultResetCollectionWait);
 }
 
 // ---- connection ----
@@ -74,7 +76,7 @@ std::int32_t QFCSystem::GetResetCollectionWait() {
 HRESULT QFCSystem::SetConnection(bool connect, bool report) {
   if (admin_ != nullptr) {
     if (const QFCSystem* other = admin_->FindOtherSystemOnSameHil(this)) {
-      if (report) TheApp().ReportError(kMsgOtherSystemOnSameHil, other->GetName());
+      if (report) TheReporter().ReportError(kMsgOtherSystemOnSameHil, other->GetName());
       return E_FAULTBOX_OTHER_SYSTEM_FOR_SAME_HIL_IS_ACTIVATED;
     }
   }
@@ -84,29 +86,29 @@ HRESULT QFCSystem::SetConnection(bool connect, bool report) {
   } else {
     QFCAbstractFailurePattern* activated = nullptr;
     if (HasActivatedPattern(activated)) {
-      if (report) TheApp().ReportError(kMsgDisconnectWhileActivated, GetName());
+      if (report) TheReporter().ReportError(kMsgDisconnectWhileActivated, GetName());
       return E_FAULTBOX_DISCONNECT;
     }
   }
   QFCAbstractTransferInterface* transfer = GetTransferInterface();
   if (transfer == nullptr) {
-    if (report) TheApp().ReportError(kMsgNotConnected);
+    if (report) TheReporter().ReportError(kMsgNotConnected);
     return E_FAULTBOX_NOT_CONNECTED_TO_HARDWARE;
   }
 
   HRESULT result = FAULTBOX_OK;
   if (platformType_ != fptKR40Platform && platformType_ != fptKR60Platform) {
-    TheApp().ReportError(kMsgUnsupportedPlatform, std::to_string(platformType_));
+    TheReporter().ReportError(kMsgUnsupportedPlatform, std::to_string(platformType_));
     result = E_FAULTBOX;
   } else if (!InterfaceFitsPlatform(transfer, platformType_)) {
-    TheApp().ReportInternalFault(kPlaceInterfaceNotOfPlatform);
+    TheReporter().ReportInternalFault(kPlaceInterfaceNotOfPlatform);
     result = E_FAULTBOX_NULL_POINTER;
   } else {
     result = transfer->Connect(connect, 0, 0);
     if (result == FAULTBOX_OK && connect) {
       connected_ = true;
       // A bench that answers badly is reported by the reset; the connection stands.
-      ResetHardware();
+      (void)ResetHardware();
       if (report) UpdateViews(kUpdateConnection);
       return result;
     }
@@ -150,13 +152,13 @@ HRESULT QFCSystem::ResetHardware() {
   } else if (platformType_ == fptKR40Platform) {
     result = ResetKR40Hardware(completed);
   } else {
-    TheApp().ReportError(kMsgUnsupportedPlatform, std::to_string(platformType_));
+    TheReporter().ReportError(kMsgUnsupportedPlatform, std::to_string(platformType_));
     return E_FAULTBOX_BOARD_TYPE_IS_NOT_SUPORTED;
   }
   if (completed) {
     // The relays are all off: no pattern holds the hardware any more.
     patterns_->ClearActivatedFlags();
-    TheApp().ReportInfo(kMsgResetFinished);
+    TheReporter().ReportInfo(kMsgResetFinished);
   }
   // The map was emptied even when a send failed: the pins must not claim
   // modules that nobody has heard since.
@@ -169,12 +171,12 @@ HRESULT QFCSystem::ResetKR60Hardware(bool& completed) {
   completed = false;
   auto* can = dynamic_cast<QFCCANTransferInterface*>(GetTransferInterface());
   if (can == nullptr) {
-    TheApp().ReportInternalFault(kPlaceResetNotCAN);
+    TheReporter().ReportInternalFault(kPlaceResetNotCAN);
     return E_FAULTBOX_NULL_POINTER;
   }
   // An offset that cannot be read (reported) leaves 0: the reset still goes out.
   std::uint32_t offset = 0;
-  GetLoadAddress("OffsetLoadAddress", offset);
+  if (GetLoadAddress("OffsetLoadAddress", offset) != FAULTBOX_OK) offset = 0;
 
   QFCMessageList messages;
   for (std::uint32_t type : {kModuleLOAD, kModuleFIU, kModuleRSIM})
@@ -200,7 +202,7 @@ HRESULT QFCSystem::ResetKR60Hardware(bool& completed) {
 
     const QFCAbstractHardwareInfo* info = hardwareInfos_.empty() ? nullptr : hardwareInfos_.front().get();
     if (info == nullptr) {
-      TheApp().ReportInternalFault(kPlaceNoHardwareInfo);
+      TheReporter().ReportInternalFault(kPlaceNoHardwareInfo);
     } else {
       const struct {
         std::string text;
@@ -213,12 +215,12 @@ HRESULT QFCSystem::ResetKR60Hardware(bool& completed) {
         std::uint32_t address = 0;
         result = GetLoadAddress(module.key, address);
         if (result != FAULTBOX_OK) {
-          TheApp().ReportInternalFault(kPlaceLoadAddressUnreadable);
+          TheReporter().ReportInternalFault(kPlaceLoadAddressUnreadable);
           break;
         }
         if (address > std::numeric_limits<std::uint16_t>::max() ||
             respondingModules_.count(static_cast<std::uint16_t>(address)) == 0)
-          TheApp().ReportError(module.message, HexAddress(address));
+          TheReporter().ReportError(module.message, HexAddress(address));
       }
     }
   }
@@ -230,7 +232,7 @@ HRESULT QFCSystem::ResetKR40Hardware(bool& completed) {
   completed = false;
   auto* serial = dynamic_cast<QFCSerielleTransferInterface*>(GetTransferInterface());
   if (serial == nullptr) {
-    TheApp().ReportInternalFault(kPlaceResetNotSerial);
+    TheReporter().ReportInternalFault(kPlaceResetNotSerial);
     return E_FAULTBOX_NULL_POINTER;
   }
   QFCMessageList messages;
@@ -250,7 +252,7 @@ HRESULT QFCSystem::ResetKR40Hardware(bool& completed) {
   for (std::size_t i = 0; i < messages.size(); ++i) {
     const auto* message = dynamic_cast<const QFCSerielleMessage*>(messages[i].get());
     if (message == nullptr) {
-      TheApp().ReportInternalFault(kPlaceResetNotSerial);
+      TheReporter().ReportInternalFault(kPlaceResetNotSerial);
       return E_FAULTBOX_NULL_POINTER;
     }
     if (HRESULT sent = serial->SendByte(message); sent != FAULTBOX_OK) return sent;

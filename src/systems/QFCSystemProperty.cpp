@@ -6,7 +6,7 @@
 
 #include "comm/QFCAbstractTransferInterface.h"
 #include "config/QFCFSHelper.h"
-#include "host/QFCFaultboxApp.h"
+#include "platform/QFCReporter.h"
 #include "platform/Archive.h"
 #include "platform/FileHelper.h"
 #include "platform/MessageTable.h"
@@ -65,11 +65,11 @@ const std::string& QFCSystemProperty::GetLabelText(int index) const {
 
 bool QFCSystemProperty::MaySetSettings(const void* settings) const {
   if (IsReadOnly()) {
-    TheApp().ReportError(kMsgReadOnly, GetName());
+    TheReporter().ReportError(kMsgReadOnly, GetName());
     return false;
   }
   if (!IsInterfaceFree()) {
-    TheApp().ReportError(kMsgInterfaceConnected, {}, {}, kShown);
+    TheReporter().ReportError(kMsgInterfaceConnected, {}, {}, kShown);
     return false;
   }
   return settings != nullptr;
@@ -123,7 +123,7 @@ HRESULT QFCSystemProperty::SetInterfaceParameter(std::int32_t deviceType, std::i
                                                  std::int32_t value2) {
   if (platformType_ == 1) {
     if (deviceType != fdtRS232_IF_PORT) {
-      TheApp().ReportError(kMsgWrongDeviceType, {}, {}, kShown);
+      TheReporter().ReportError(kMsgWrongDeviceType, {}, {}, kShown);
       return E_FAULTBOX;
     }
     QFTSerialInterfaceSettings settings;
@@ -131,14 +131,14 @@ HRESULT QFCSystemProperty::SetInterfaceParameter(std::int32_t deviceType, std::i
     settings.deviceType = fdtRS232_IF_PORT;
     settings.portNumber = static_cast<std::uint32_t>(value1);
     if (!SetSerialSettings(&settings)) {
-      TheApp().ReportInternalFault(kPlaceSerialSettingsRefused);
+      TheReporter().ReportInternalFault(kPlaceSerialSettingsRefused);
       return E_FAULTBOX;
     }
     return FAULTBOX_OK;
   }
   if (platformType_ == 2) {
     if (deviceType != fdtCAN_IF_VI_CAN_CARD_X && deviceType != fdtCAN_IF_LINKBOX_USB) {
-      TheApp().ReportError(kMsgWrongDeviceType, {}, {}, kShown);
+      TheReporter().ReportError(kMsgWrongDeviceType, {}, {}, kShown);
       return E_FAULTBOX;
     }
     QFTCANInterfaceSettings settings = can_;
@@ -147,7 +147,7 @@ HRESULT QFCSystemProperty::SetInterfaceParameter(std::int32_t deviceType, std::i
     settings.firstParameter = static_cast<std::uint8_t>(value1 & 0xFF);
     settings.secondParameter = static_cast<std::uint8_t>(value2 & 0xFF);
     if (!SetCANSettings(&settings)) {
-      TheApp().ReportInternalFault(kPlaceCANSettingsRefused);
+      TheReporter().ReportInternalFault(kPlaceCANSettingsRefused);
       return E_FAULTBOX;
     }
     return FAULTBOX_OK;
@@ -161,24 +161,7 @@ bool QFCSystemProperty::IsInterfaceFree() const {
   return true;
 }
 
-std::int32_t QFCSystemProperty::GetTransferTimeout() {
-  return ReadCountSetting(Settings::kComponentSection, "Timeout", kDefaultTransferTimeout);
-}
-
-std::int32_t QFCSystemProperty::ReadCountSetting(const char* section, const char* key,
-                                                 std::int32_t fallback) {
-  const std::optional<std::string> text = Settings::GetString(section, key);
-  if (!text) return fallback;
-  std::uint32_t value = 0;
-  // An empty value would convert to 0 and make every wait fail at once: it is
-  // no number, like any other text the conversion refuses.
-  if (QFCFSHelper::Trim(*text).empty() || !QFCFSHelper::StringToNumber(*text, value, 10) ||
-      value > static_cast<std::uint32_t>(std::numeric_limits<std::int32_t>::max())) {
-    TheApp().ReportWarning(kMsgInvalidValue, key, "Value: " + *text + ", File: " + Settings::Path());
-    return fallback;
-  }
-  return static_cast<std::int32_t>(value);
-}
+std::int32_t QFCSystemProperty::GetTransferTimeout() { return QFCAbstractTransferInterface::ReadTransferTimeout(); }
 
 // ---- transfer interfaces ----
 
@@ -231,13 +214,13 @@ void QFCSystemProperty::LoadProperties(Archive& ar) {
   const std::string storedFile = QFCFileHelper::ToNative(ar.ReadString());
   const std::string currentFile = QFCFileHelper::ToNative(failureClassFile_);
   if (!QFCFSHelper::EqualNoCase(storedFile, currentFile))
-    TheApp().ReportWarning(kMsgFailureClassFileDiffers, storedFile, currentFile);
+    TheReporter().ReportWarning(kMsgFailureClassFileDiffers, storedFile, currentFile);
 
   // Stored in the order first, third, second.
   for (int index : {0, 2, 1}) {
     const std::string stored = ar.ReadString();
     const std::string& current = spareTexts_[static_cast<std::size_t>(index)];
-    if (stored != current) TheApp().ReportWarning(kSpareTextMessages[index], stored, current);
+    if (stored != current) TheReporter().ReportWarning(kSpareTextMessages[index], stored, current);
   }
 
   // Each entry is at least a one-byte text length and a 4-byte flag.
@@ -261,8 +244,8 @@ void QFCSystemProperty::LoadProperties(Archive& ar) {
     busTiming0_ = ar.ReadU32();
     busTiming1_ = ar.ReadU32();
   } else {
-    TheApp().ReportError(kMsgBadPlatform, std::to_string(platform));
-    TheApp().ReportInternalFault(kPlaceStoredPlatform);
+    TheReporter().ReportError(kMsgBadPlatform, std::to_string(platform));
+    TheReporter().ReportInternalFault(kPlaceStoredPlatform);
     // What follows was written for an unknown layout: reading on would take
     // its bytes for ECU names and patterns.
     throw ArchiveException(ArchiveCause::kGeneric, "platform type " + std::to_string(platform));

@@ -14,54 +14,18 @@
 #include <vector>
 
 #include "config/QFCAbstractObjectData.h"
-#include "host/ResultCodes.h"
+#include "comm/QFCAbstractTransferInterface.h"
+#include "platform/InterfaceSettings.h"
+#include "platform/ResultCodes.h"
 
 namespace faultbox {
 
 class Archive;
-class QFCAbstractTransferInterface;
 
-// Device types of the interface settings (the automation enumeration FSDeviceType).
-enum FSDeviceType : std::int32_t {
-  fdtCAN_IF_VI_CAN_CARD_X = 1,
-  fdtCAN_IF_LINKBOX_USB = 4,
-  fdtRS232_IF_PORT = 200,
-};
-
-// The serial port of a KR40-family system.
-struct QFTSerialInterfaceSettings {
-  std::string portName = "COM1";
-  std::uint32_t deviceType = fdtRS232_IF_PORT;
-  std::uint32_t portNumber = 1;
-};
-
-// The CAN channel of a KR60 system, laid out as one channel description of the
-// CAN access layer, so that the record is handed to it and taken from it
-// unchanged. Only the device type, the two interface parameters and the three
-// further values are ours; the rest belongs to the access layer.
-struct QFTCANInterfaceSettings {
-  std::uint8_t head[256] = {};  // the channel's name as the access layer fills it
-  std::uint32_t deviceType = fdtCAN_IF_VI_CAN_CARD_X;
-  std::uint8_t firstParameter = 1;   // board of the device
-  std::uint8_t secondParameter = 1;  // channel of the board
-  std::uint8_t reserved[2] = {};
-  std::uint32_t furtherValues[3] = {};  // copied from the matching available channel
-  std::uint8_t rest[256] = {};
-};
-static_assert(std::is_standard_layout_v<QFTCANInterfaceSettings> &&
-              std::is_trivially_copyable_v<QFTCANInterfaceSettings>);
-static_assert(sizeof(QFTCANInterfaceSettings) == 532);
-static_assert(offsetof(QFTCANInterfaceSettings, deviceType) == 256);
-static_assert(offsetof(QFTCANInterfaceSettings, firstParameter) == 260);
-static_assert(offsetof(QFTCANInterfaceSettings, secondParameter) == 261);
-static_assert(offsetof(QFTCANInterfaceSettings, furtherValues) == 264);
-static_assert(offsetof(QFTCANInterfaceSettings, rest) == 276);
-
-class QFCSystemProperty : public QFCAbstractObjectData {
+class QFCSystemProperty : public QFCAbstractObjectData, public QFITransferOwner {
  public:
-  static constexpr std::int32_t kDefaultTransferTimeout = 1000;
-  static constexpr std::uint32_t kDefaultBusTiming0 = 0x47;
-  static constexpr std::uint32_t kDefaultBusTiming1 = 0x14;
+  static constexpr std::uint32_t kDefaultBusTiming0 = kDefaultCanBusTiming0;
+  static constexpr std::uint32_t kDefaultBusTiming1 = kDefaultCanBusTiming1;
   // Message numbers of the spare texts, in the order first, second, third.
   static constexpr int kSpareTextMessages[3] = {93, 99, 98};
 
@@ -73,21 +37,23 @@ class QFCSystemProperty : public QFCAbstractObjectData {
   void Serialize(Archive& ar) override;
 
   // ---- interface settings ----
-  const QFTSerialInterfaceSettings& GetSerialSettings() const { return serial_; }
+  const std::string& GetName() const override { return QFCAbstractObjectData::GetName(); }
+  bool IsReadOnly() const override { return QFCAbstractObjectData::IsReadOnly(); }
+  const QFTSerialInterfaceSettings& GetSerialSettings() const override { return serial_; }
   // Refused (false) on a read-only system (message 118), while a transfer
   // interface is connected (message 169) and for a null record.
   bool SetSerialSettings(const QFTSerialInterfaceSettings* settings);
-  const QFTCANInterfaceSettings& GetCANSettings() const { return can_; }
-  bool SetCANSettings(const QFTCANInterfaceSettings* settings);
-  void GetBusTiming(std::uint32_t& first, std::uint32_t& second) const;
+  const QFTCANInterfaceSettings& GetCANSettings() const override { return can_; }
+  bool SetCANSettings(const QFTCANInterfaceSettings* settings) override;
+  void GetBusTiming(std::uint32_t& first, std::uint32_t& second) const override;
   void SetBusTiming(std::uint32_t first, std::uint32_t second);
 
   // (device type, port number, 0) for the KR40 family, (device type, first,
   // second interface parameter) for KR60; other platforms leave the values.
-  HRESULT GetInterfaceParameter(std::int32_t& deviceType, std::int32_t& value1, std::int32_t& value2) const;
+  [[nodiscard]] HRESULT GetInterfaceParameter(std::int32_t& deviceType, std::int32_t& value1, std::int32_t& value2) const;
   // Takes effect at the next connect. Message 57 for a device type that does
   // not suit the platform.
-  HRESULT SetInterfaceParameter(std::int32_t deviceType, std::int32_t value1, std::int32_t value2);
+  [[nodiscard]] HRESULT SetInterfaceParameter(std::int32_t deviceType, std::int32_t value1, std::int32_t value2);
   // True when none of the system's transfer interfaces is connected.
   bool IsInterfaceFree() const;
 
@@ -96,10 +62,6 @@ class QFCSystemProperty : public QFCAbstractObjectData {
   // class 2) and 1000 is used. Read anew on every call: each transfer
   // interface asks once and keeps the answer.
   static std::int32_t GetTransferTimeout();
-  // A decimal count of the settings file, `fallback` when it is missing; a
-  // value that is not a decimal number from 0 up is reported (message 37,
-  // class 2) and `fallback` used.
-  static std::int32_t ReadCountSetting(const char* section, const char* key, std::int32_t fallback);
 
   // ---- transfer interfaces ----
   QFCAbstractTransferInterface* GetTransferInterface() const { return currentTransferInterface_; }

@@ -8,6 +8,7 @@
 #include <nlohmann/json.hpp>
 
 #include "support/RunProcess.h"
+#include "TestPaths.h"
 
 namespace faultbox {
 namespace {

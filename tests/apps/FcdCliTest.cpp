@@ -7,6 +7,7 @@
 #include <vector>
 
 #include "support/RunProcess.h"
+#include "TestPaths.h"
 
 namespace faultbox {
 namespace {

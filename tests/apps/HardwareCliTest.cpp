@@ -14,6 +14,7 @@
 
 #include "support/BackgroundProcess.h"
 #include "support/RunProcess.h"
+#include "TestPaths.h"
 
 namespace faultbox {
 namespace {

@@ -74,7 +74,7 @@ class AutomationKR60Sim : public ::testing::Test {
     ASSERT_EQ(p3_->SetFailureClass(3, Variant{std::int64_t{0}}), FAULTBOX_OK);
   }
   void TearDown() override {
-    if (pattern_) pattern_->Deactivate();
+    if (pattern_) (void)pattern_->Deactivate();  // tests that leave it activated only
     bench_.DropRoot();
     sim::RemoveKR60SimBench(kBenchName);
     CanChannelTable::SetOverride({});
@@ -147,10 +147,10 @@ TEST_F(AutomationKR60Sim, ResetOfAnActivatedPatternOrPinChangesNothing) {
                             std::function<HRESULT()>([&] { return p1_->Reset(); })}) {
     EXPECT_EQ(reset(), E_FAULTBOX_FAILURE_PATTERN_ARE_ACTIVATED);
     std::vector<std::int32_t> after;
-    p1_->get_PinConfig(after);
+    EXPECT_EQ(p1_->get_PinConfig(after), FAULTBOX_OK);
     EXPECT_EQ(after, before);
     std::int32_t id = 0, vector = -1;
-    p1_->get_AdjustedFailureClassID(id, vector);
+    EXPECT_EQ(p1_->get_AdjustedFailureClassID(id, vector), FAULTBOX_OK);
     EXPECT_EQ(id, 2);
     EXPECT_EQ(Relays(), relays);
   }
@@ -162,7 +162,7 @@ TEST_F(AutomationKR60Sim, ResetOfAnActivatedPatternOrPinChangesNothing) {
   EXPECT_EQ(system_->ResetHardware(), FAULTBOX_OK);
   EXPECT_EQ(system_->Disconnect(), FAULTBOX_OK);
   VARIANT_BOOL flag = VARIANT_TRUE;
-  system_->IsConnected(flag);
+  EXPECT_EQ(system_->IsConnected(flag), FAULTBOX_OK);
   EXPECT_EQ(flag, VARIANT_FALSE);
 }
 

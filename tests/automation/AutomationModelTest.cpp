@@ -123,7 +123,7 @@ TEST(AutomationModelTest, OpenRefusesMissingFilesAndGivesAnOpenDocumentOnce) {
   ASSERT_EQ(bench.systems().Open(document, again), FAULTBOX_OK);
   EXPECT_EQ(system, again);
   std::int32_t count = 0;
-  bench.systems().get_Count(count);
+  EXPECT_EQ(bench.systems().get_Count(count), FAULTBOX_OK);
   EXPECT_EQ(count, 1);
 }
 
@@ -250,7 +250,7 @@ TEST(AutomationModelTest, KeptReferencesOfAClosedSystemFailWithTheKeptText) {
   }
   EXPECT_FALSE(system->IsAttached());
   std::int32_t count = -1;
-  bench.systems().get_Count(count);
+  EXPECT_EQ(bench.systems().get_Count(count), FAULTBOX_OK);
   EXPECT_EQ(count, 0);
   // Released after the model is gone, in any order.
   system.reset();
@@ -385,7 +385,7 @@ TEST(AutomationModelTest, PatternAndPinCollections) {
   EXPECT_EQ(pins->Remove(Named("P1"), "Brake"), FAULTBOX_OK);
   EXPECT_FALSE(removed->IsAttached());
   std::int32_t count = 0;
-  pins->get_Count(count);
+  EXPECT_EQ(pins->get_Count(count), FAULTBOX_OK);
   EXPECT_EQ(count, 2);
   EXPECT_EQ(patterns->Remove(At(0)), FAULTBOX_OK);
   EXPECT_FALSE(alpha->IsAttached());
@@ -409,7 +409,7 @@ TEST(AutomationModelTest, ActivateRefusesABadPinArrayBeforeTouchingAnything) {
   auto gamma = bench.MakePattern(*system, "Gamma", {{"P2", "Engine"}});
   auto detached = AutomationBench::Pin(*gamma, 0);
   std::shared_ptr<QFCFailurePatternsImpl> patterns;
-  system->get_FailurePatterns(patterns);
+  EXPECT_EQ(system->get_FailurePatterns(patterns), FAULTBOX_OK);
   ASSERT_EQ(patterns->Remove(Named("Gamma")), FAULTBOX_OK);
 
   struct Case {
@@ -433,7 +433,7 @@ TEST(AutomationModelTest, ActivateRefusesABadPinArrayBeforeTouchingAnything) {
     EXPECT_EQ(LastError(), c.text) << c.name;
     // The selection is as it was and the transfer was never started.
     VARIANT_BOOL selected = 0;
-    own->IsSelected(selected);
+    EXPECT_EQ(own->IsSelected(selected), FAULTBOX_OK);
     EXPECT_EQ(selected, VARIANT_TRUE) << c.name;
     EXPECT_EQ(capture.Find(164), nullptr) << c.name;
   }
@@ -460,16 +460,16 @@ TEST(AutomationModelTest, ResetOfAnActivatedPatternOrPinChangesNothing) {
   EXPECT_EQ(LastError(), ResourceString(8912));
   EXPECT_EQ(first->Reset(), E_FAULTBOX_FAILURE_PATTERN_ARE_ACTIVATED);
   std::vector<std::int32_t> config;
-  first->get_PinConfig(config);
+  EXPECT_EQ(first->get_PinConfig(config), FAULTBOX_OK);
   EXPECT_EQ(config, (std::vector<std::int32_t>{1, 0, 1, 0, 0}));
-  second->get_PinConfig(config);
+  EXPECT_EQ(second->get_PinConfig(config), FAULTBOX_OK);
   EXPECT_EQ(config, (std::vector<std::int32_t>{0, 1, 0, 0, 0}));
   VARIANT_BOOL activated = 0;
-  pattern->IsActivated(activated);
+  EXPECT_EQ(pattern->IsActivated(activated), FAULTBOX_OK);
   EXPECT_EQ(activated, VARIANT_TRUE);
   std::shared_ptr<QFCFailurePatternsImpl> patterns;
   std::shared_ptr<QFCBaseFailurePatternImpl> found;
-  system->get_FailurePatterns(patterns);
+  EXPECT_EQ(system->get_FailurePatterns(patterns), FAULTBOX_OK);
   EXPECT_EQ(patterns->get_ActivatedFailurePattern(found), FAULTBOX_OK);
   EXPECT_EQ(found, pattern);
   // Closing is refused too: the system would go with its relays switched.
@@ -483,13 +483,13 @@ TEST(AutomationModelTest, ResetOfAnActivatedPatternOrPinChangesNothing) {
     return std::count(entries.begin(), entries.end(), 1);
   };
   EXPECT_EQ(second->Reset(), FAULTBOX_OK);
-  second->get_PinConfig(config);
+  EXPECT_EQ(second->get_PinConfig(config), FAULTBOX_OK);
   EXPECT_EQ(switchedOn(config), 0);
-  first->get_PinConfig(config);
+  EXPECT_EQ(first->get_PinConfig(config), FAULTBOX_OK);
   EXPECT_EQ(switchedOn(config), 2);
   model->SetActivated(false);
   EXPECT_EQ(pattern->Reset(), FAULTBOX_OK);
-  first->get_PinConfig(config);
+  EXPECT_EQ(first->get_PinConfig(config), FAULTBOX_OK);
   EXPECT_EQ(switchedOn(config), 0);
 }
 
@@ -611,8 +611,8 @@ TEST(AutomationModelTest, SaveStoresTheScriptsChanges) {
   ASSERT_EQ(bench.systems().Open(path, reopened), FAULTBOX_OK);
   std::shared_ptr<QFCFailurePatternsImpl> patterns;
   std::vector<std::string> names;
-  reopened->get_FailurePatterns(patterns);
-  patterns->get_Names(names);
+  EXPECT_EQ(reopened->get_FailurePatterns(patterns), FAULTBOX_OK);
+  EXPECT_EQ(patterns->get_Names(names), FAULTBOX_OK);
   EXPECT_EQ(names, (std::vector<std::string>{"Made by a script"}));
   EXPECT_NE(reopened, system);
 }

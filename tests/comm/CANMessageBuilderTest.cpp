@@ -14,12 +14,12 @@
 #include <vector>
 
 #include "comm/QFCCANMessage.h"
-#include "comm/QFCCANMessageBuilder.h"
+#include "patterns/kr60/QFCCANMessageBuilder.h"
 #include "config/QFCAbstractFailureClasses.h"
 #include "patterns/KR60PatternBench.h"
 #include "patterns/QFCAbstractFailurePatternPin.h"
 #include "patterns/QFCFailurePatternPins.h"
-#include "patterns/QFCKR60FailurePattern.h"
+#include "patterns/kr60/QFCKR60FailurePattern.h"
 #include "support/MessageCapture.h"
 #include "systems/QFCSystem.h"
 

@@ -6,7 +6,7 @@
 #include <cstdint>
 
 #include "comm/QFCCANMessage.h"
-#include "comm/QFCCANMessageBuilder.h"
+#include "patterns/kr60/QFCCANMessageBuilder.h"
 
 namespace faultbox {
 namespace {

@@ -12,18 +12,19 @@
 #include <thread>
 #include <vector>
 
-#include "comm/QFCCANMessageBuilder.h"
+#include "patterns/kr60/QFCCANMessageBuilder.h"
 #include "comm/QFCCANTransferInterface.h"
 #include "config/QFCAbstractFailureClasses.h"
 #include "config/QFCECU.h"
 #include "kr60/KR60Simulator.h"
 #include "patterns/QFCAbstractFailurePatternPin.h"
 #include "patterns/QFCFailurePatterns.h"
-#include "patterns/QFCKR60FailurePattern.h"
+#include "patterns/kr60/QFCKR60FailurePattern.h"
 #include "support/BackgroundProcess.h"
 #include "support/MessageCapture.h"
 #include "systems/QFCSystem.h"
 #include "systems/SystemTestBench.h"
+#include "TestPaths.h"
 
 namespace faultbox {
 namespace {
@@ -180,7 +181,7 @@ class KR60EndToEnd : public ::testing::Test {
     ++resets_;
     system_->GetRespondingModules().clear();
     std::uint32_t offset = 0;
-    system_->GetLoadAddress("OffsetLoadAddress", offset);
+    EXPECT_EQ(system_->GetLoadAddress("OffsetLoadAddress", offset), FAULTBOX_OK);
     QFCMessageList list;
     for (std::uint32_t type : {kModuleLOAD, kModuleFIU, kModuleRSIM})
       QFCCANMessageBuilder::BuildResetMessages(QFCCANMessageBuilder::kResetSelector, type, list, offset);

@@ -5,7 +5,7 @@
 
 #include <ostream>
 
-#include "comm/QFCSerielleMessageBuilder.h"
+#include "patterns/kr40/QFCSerielleMessageBuilder.h"
 #include "patterns/PatternTestBench.h"
 
 namespace faultbox {

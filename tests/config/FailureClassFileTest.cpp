@@ -10,8 +10,8 @@
 
 #include "config/FailureClassLoader.h"
 #include "config/FailureClassSource.h"
-#include "config/QFCKR40FailureClasses.h"
-#include "config/QFCKR60FailureClasses.h"
+#include "config/kr40/QFCKR40FailureClasses.h"
+#include "config/kr60/QFCKR60FailureClasses.h"
 #include "platform/Archive.h"
 #include "support/MessageCapture.h"
 #include "support/RunProcess.h"

@@ -10,9 +10,10 @@
 
 #include "config/FailureClassLoader.h"
 #include "config/FailureClassSource.h"
-#include "config/QFCKR60FailureClasses.h"
+#include "config/kr60/QFCKR60FailureClasses.h"
 #include "support/MessageCapture.h"
 #include "support/RunProcess.h"
+#include "TestPaths.h"
 
 namespace faultbox {
 namespace {

@@ -6,8 +6,8 @@
 #include <limits>
 #include <vector>
 
-#include "config/QFCKR40FailureClasses.h"
-#include "config/QFCKR60FailureClasses.h"
+#include "config/kr40/QFCKR40FailureClasses.h"
+#include "config/kr60/QFCKR60FailureClasses.h"
 
 namespace faultbox {
 namespace {

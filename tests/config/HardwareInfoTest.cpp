@@ -7,8 +7,8 @@
 #include <memory>
 
 #include "config/PinFileText.h"
-#include "config/QFCKR40HardwareInfo.h"
-#include "config/QFCKR60HardwareInfo.h"
+#include "config/kr40/QFCKR40HardwareInfo.h"
+#include "config/kr60/QFCKR60HardwareInfo.h"
 #include "support/MessageCapture.h"
 #include "support/RunProcess.h"
 

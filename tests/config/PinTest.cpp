@@ -5,8 +5,8 @@
 #include <memory>
 
 #include "config/QFCECU.h"
-#include "config/QFCKR40Pin.h"
-#include "config/QFCKR60Pin.h"
+#include "config/kr40/QFCKR40Pin.h"
+#include "config/kr60/QFCKR60Pin.h"
 #include "platform/Archive.h"
 #include "support/MessageCapture.h"
 

@@ -1,14 +1,14 @@
 // The reporting operations and the error module behind them.
 #include <gtest/gtest.h>
 
-#include "host/QFCFaultboxApp.h"
+#include "platform/QFCReporter.h"
 #include "support/MessageCapture.h"
 
 namespace faultbox {
 namespace {
 
 TEST(ErrorReportingTest, WithoutAModuleNothingIsReported) {
-  QFCFaultboxApp app;  // never started
+  QFCReporter app;  // never started
   EXPECT_EQ(app.ReportError(47, "a"), E_FAULTBOX);
   EXPECT_EQ(app.ReportWarning(47), E_FAULTBOX);
   EXPECT_EQ(app.ReportInfo(47), E_FAULTBOX);
@@ -26,10 +26,10 @@ TEST(ErrorReportingTest, WithoutAModuleNothingIsReported) {
 
 TEST(ErrorReportingTest, ClassesNumbersAndTextsReachTheSink) {
   test::MessageCapture capture;
-  EXPECT_EQ(TheApp().ReportError(46, "pins.csv"), FAULTBOX_OK);
-  EXPECT_EQ(TheApp().ReportWarning(64, "a.csv", "b.csv", 1), FAULTBOX_OK);
-  EXPECT_EQ(TheApp().ReportInfo(115, "System 1"), FAULTBOX_OK);
-  TheApp().ReportInternalFault(563);
+  EXPECT_EQ(TheReporter().ReportError(46, "pins.csv"), FAULTBOX_OK);
+  EXPECT_EQ(TheReporter().ReportWarning(64, "a.csv", "b.csv", 1), FAULTBOX_OK);
+  EXPECT_EQ(TheReporter().ReportInfo(115, "System 1"), FAULTBOX_OK);
+  TheReporter().ReportInternalFault(563);
 
   ASSERT_EQ(capture.records.size(), 4u);
   const int classes[] = {3, 2, 1, 0};
@@ -41,12 +41,12 @@ TEST(ErrorReportingTest, ClassesNumbersAndTextsReachTheSink) {
   EXPECT_TRUE(capture.shown[3]);  // internal faults are always shown
   EXPECT_EQ(capture.records[3].first, "563");
   EXPECT_NE(capture.records[0].Text().find("pins.csv"), std::string::npos);
-  EXPECT_EQ(TheApp().Module()->GetStackSize(0), 0);  // everything shown was taken off the stack
+  EXPECT_EQ(TheReporter().Module()->GetStackSize(0), 0);  // everything shown was taken off the stack
 }
 
 TEST(ErrorReportingTest, StackOperationsWhileDisplayIsHeld) {
   test::MessageCapture capture;
-  QFCErrorModuleAdapter& adapter = TheApp().ErrorAdapter();
+  QFCErrorModuleAdapter& adapter = TheReporter().ErrorAdapter();
   adapter.SetMode(false);
   const int first = adapter.SetError(3, 46, "one", "", 0);
   const int second = adapter.SetError(2, 64, "two", "", 0);

@@ -77,7 +77,7 @@ TEST(PatternPins, NoAdjustedClassIsSilent) {
 
 TEST(PatternNames, DefaultNamesCountFromOneAndFillGaps) {
   PatternBench bench(ThreePins());
-  auto name = [](int n) { return QFCAbstractFailurePattern::ResourceText(6769, {std::to_string(n)}); };
+  auto name = [](int n) { return ResourceText(6769, {std::to_string(n)}); };
   EXPECT_EQ(bench.Create()->GetName(), name(1));
   EXPECT_EQ(bench.Create()->GetName(), name(2));
   EXPECT_EQ(bench.Create()->GetName(), name(3));

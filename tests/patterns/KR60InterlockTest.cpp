@@ -5,8 +5,9 @@
 #include <gtest/gtest.h>
 
 #include "patterns/KR60PatternBench.h"
-#include "patterns/QFCKR60FailurePatternSafetyInterlock.h"
+#include "patterns/kr60/QFCKR60FailurePatternSafetyInterlock.h"
 #include "platform/MessageTable.h"
+#include "platform/UserMode.h"
 
 namespace faultbox {
 namespace {
@@ -173,8 +174,8 @@ TEST(KR60Interlock, ActivatedPinKeepsItsClass) {
 // exclusive-entry rule is off.
 TEST(KR60Interlock, ServiceModeChecksOnePinWithoutTheRule) {
   ExclusiveBench b(0);
-  b.bench.files().SetSetting("UserMode", QFCFaultboxApp::kServiceModeCode);
-  TheApp().ResetUserMode();
+  b.bench.files().SetSetting("UserMode", kServiceModeCode);
+  ResetUserMode();
   b.UseExternalHardware();
   ASSERT_TRUE(b.p1->SetPinConfig(0, 1, false));
   ASSERT_TRUE(b.p2->SetPinConfig(0, 1, false));

@@ -10,7 +10,7 @@
 #include <vector>
 
 #include "patterns/PatternTestBench.h"
-#include "patterns/QFCKR60FailurePattern.h"
+#include "patterns/kr60/QFCKR60FailurePattern.h"
 
 namespace faultbox::test {
 

@@ -11,7 +11,7 @@
 #include <utility>
 
 #include "patterns/KR60PatternBench.h"
-#include "patterns/QFCKR60FailurePatternPin.h"
+#include "patterns/kr60/QFCKR60FailurePatternPin.h"
 #include "platform/MessageTable.h"
 
 namespace faultbox {

@@ -5,6 +5,7 @@
 #include <sys/stat.h>
 
 #include "patterns/PatternTestBench.h"
+#include "platform/MessageTable.h"
 #include "platform/Archive.h"
 
 namespace faultbox {
@@ -226,7 +227,7 @@ TEST(PatternFolders, ChildNamesAreStoredTwice) {
   bench.root().Serialize(ar);
 
   Archive expected;
-  expected.WriteString(QFCAbstractFailurePattern::ResourceText(6768));
+  expected.WriteString(ResourceText(6768));
   expected.WriteU32(2);
   for (const char* name : {"A", "B"}) {
     expected.WriteString(name);
@@ -250,7 +251,7 @@ TEST(PatternFolders, RootNameAndDroppedReferencesOnLoad) {
   stored.WriteString("known");
   Archive ar(stored.Data());
   bench.root().Serialize(ar);
-  EXPECT_EQ(bench.root().GetName(), QFCAbstractFailurePattern::ResourceText(6768));
+  EXPECT_EQ(bench.root().GetName(), ResourceText(6768));
   ASSERT_EQ(bench.root().GetPatternCount(), 1);
   EXPECT_EQ(bench.root().GetPatternAt(0)->GetName(), "Known");
 }

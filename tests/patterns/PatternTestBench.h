@@ -20,7 +20,7 @@
 #include "patterns/QFCFailurePatternNode.h"
 #include "patterns/QFCFailurePatternPins.h"
 #include "patterns/QFCFailurePatterns.h"
-#include "patterns/QFCKR40FailurePattern.h"
+#include "patterns/kr40/QFCKR40FailurePattern.h"
 #include "platform/Archive.h"
 #include "support/MessageCapture.h"
 #include "systems/QFCSystem.h"

@@ -4,7 +4,8 @@
 #include <gtest/gtest.h>
 
 #include "patterns/PatternTestBench.h"
-#include "patterns/QFCKR40FailurePatternSafetyInterlock.h"
+#include "patterns/kr40/QFCKR40FailurePatternSafetyInterlock.h"
+#include "platform/UserMode.h"
 
 namespace faultbox {
 namespace {
@@ -146,8 +147,8 @@ TEST(InterlockServiceMode, PinChangeChecksOnlyThatPin) {
   for (bool service : {false, true}) {
     SCOPED_TRACE(service ? "service mode" : "standard mode");
     PatternBench bench({{"P1", "Engine", "1"}, {"P2", "Engine", "1"}});
-    if (service) bench.files().SetSetting("UserMode", QFCFaultboxApp::kServiceModeCode);
-    TheApp().ResetUserMode();
+    if (service) bench.files().SetSetting("UserMode", kServiceModeCode);
+    ResetUserMode();
     bench.AddClass(1, {"00002"});
     auto* pattern = bench.CreateWith({bench.Pin("Engine", "P1"), bench.Pin("Engine", "P2")});
     auto* p1 = pattern->GetPinAt(0);

@@ -24,6 +24,7 @@
 #include "support/BackgroundProcess.h"
 #include "support/RunProcess.h"
 #include "systems/QFCSystemProperty.h"
+#include "TestPaths.h"
 
 namespace faultbox {
 namespace {

@@ -17,6 +17,7 @@
 #include "kr40/KR40Simulator.h"
 #include "support/BackgroundProcess.h"
 #include "support/RunProcess.h"
+#include "TestPaths.h"
 
 namespace faultbox::sim {
 namespace {

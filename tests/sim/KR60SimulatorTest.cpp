@@ -17,6 +17,7 @@
 #include "platform/CanAccess.h"
 #include "support/BackgroundProcess.h"
 #include "support/RunProcess.h"
+#include "TestPaths.h"
 
 namespace faultbox::sim {
 namespace {

@@ -6,19 +6,19 @@
 #include <string>
 #include <vector>
 
-#include "host/QFCFaultboxApp.h"
+#include "platform/QFCReporter.h"
 
 namespace faultbox::test {
 
 class MessageCapture : public MessageSink {
  public:
   MessageCapture() {
-    TheApp().StartReporting();
-    TheApp().Module()->ClearAllErrors();
-    TheApp().Module()->AddSink(this);
+    TheReporter().StartReporting();
+    TheReporter().Module()->ClearAllErrors();
+    TheReporter().Module()->AddSink(this);
   }
   ~MessageCapture() override {
-    if (TheApp().Module()) TheApp().Module()->RemoveSink(this);
+    if (TheReporter().Module()) TheReporter().Module()->RemoveSink(this);
   }
   void Display(const ErrorRecord& record, bool show) override {
     records.push_back(record);

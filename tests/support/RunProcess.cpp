@@ -1,5 +1,6 @@
 // Process running and temporary folders for tests.
 #include "support/RunProcess.h"
+#include "TestPaths.h"
 
 #include <fcntl.h>
 #include <poll.h>

@@ -12,7 +12,7 @@
 #include "patterns/QFCAbstractFailurePattern.h"
 #include "patterns/QFCAbstractFailurePatternPin.h"
 #include "patterns/QFCFailurePatternNode.h"
-#include "patterns/QFCKR60FailurePattern.h"
+#include "patterns/kr60/QFCKR60FailurePattern.h"
 #include "platform/AtomicFile.h"
 #include "platform/MessageTable.h"
 #include "support/MessageCapture.h"
@@ -20,6 +20,7 @@
 #include "systems/QFCSystem.h"
 #include "systems/QFCSystemAdmin.h"
 #include "systems/SystemTestBench.h"
+#include "TestPaths.h"
 
 namespace faultbox {
 namespace {

@@ -107,7 +107,7 @@ TEST(SystemPatternStorageTest, DeactivateAllWithoutConnectionKeepsThePatternActi
   EXPECT_TRUE(system->IsPatternActivated());
 
   MessageCapture cap;
-  admin.DeactivateAll();
+  EXPECT_NE(admin.DeactivateAll(), FAULTBOX_OK);
   EXPECT_TRUE(system->IsPatternActivated());  // nothing could be sent
   EXPECT_EQ(cap.Count(120), 1);
   EXPECT_FALSE(alpha->GetPinAt(0)->IsSelected());

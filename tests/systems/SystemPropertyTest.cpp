@@ -15,6 +15,7 @@
 #include "support/MessageCapture.h"
 #include "systems/QFCSystem.h"
 #include "systems/SystemTestBench.h"
+#include "platform/UserMode.h"
 
 namespace faultbox {
 namespace {
@@ -203,19 +204,19 @@ TEST_P(UserModeTest, ReadOnceFromTheSetting) {
   const UserModeCase& c = GetParam();
   Bench bench;
   if (c.value) bench.SetSetting("UserMode", *c.value);
-  EXPECT_EQ(TheApp().GetUserMode(), c.mode);
+  EXPECT_EQ(GetUserMode(), c.mode);
   // Kept: a later change of the setting is not seen until the mode is read anew.
-  bench.SetSetting("UserMode", c.mode == 2 ? "0" : QFCFaultboxApp::kServiceModeCode);
-  EXPECT_EQ(TheApp().GetUserMode(), c.mode);
-  TheApp().ResetUserMode();
-  EXPECT_EQ(TheApp().GetUserMode(), c.mode == 2 ? 1 : 2);
+  bench.SetSetting("UserMode", c.mode == 2 ? "0" : kServiceModeCode);
+  EXPECT_EQ(GetUserMode(), c.mode);
+  ResetUserMode();
+  EXPECT_EQ(GetUserMode(), c.mode == 2 ? 1 : 2);
 }
 
 const UserModeCase kUserModeCases[] = {
     {"Missing", std::nullopt, 0},
     {"Zero", "0", 1},
     {"Empty", "", 1},
-    {"ServiceCode", QFCFaultboxApp::kServiceModeCode, 2},
+    {"ServiceCode", kServiceModeCode, 2},
     {"ServiceCodeInLowerCase", "8c3e51a7-2f64-4b9d-a0e7-6d15f2c94b38", 1},
 };
 
@@ -239,8 +240,8 @@ TEST(SystemPropertiesTest, LabelledTable) {
   EXPECT_EQ(table, expected);
 
   system->SetConnectedFlag(true);
-  bench.SetSetting("UserMode", QFCFaultboxApp::kServiceModeCode);
-  TheApp().ResetUserMode();
+  bench.SetSetting("UserMode", kServiceModeCode);
+  ResetUserMode();
   system->GetProperties(table);
   EXPECT_EQ(table[label(6774)], label(6772));
   EXPECT_EQ(table[label(6731)], label(6745));
@@ -360,7 +361,7 @@ TEST(SystemDocumentTest, KR60PartByteForByteAndBack) {
   EXPECT_EQ(load.Remaining(), 0u);
   EXPECT_TRUE(cap.records.empty());
   std::int32_t device = 0, value1 = 0, value2 = 0;
-  reopened->GetInterfaceParameter(device, value1, value2);
+  EXPECT_EQ(reopened->GetInterfaceParameter(device, value1, value2), FAULTBOX_OK);
   EXPECT_EQ((std::vector<std::int32_t>{device, value1, value2}), (std::vector<std::int32_t>{4, 2, 3}));
   std::uint32_t first = 0, second = 0;
   reopened->GetBusTiming(first, second);

@@ -9,7 +9,8 @@
 
 #include "config/FailureClassLoader.h"
 #include "config/QFCAbstractFailureClasses.h"
-#include "host/QFCFaultboxApp.h"
+#include "platform/QFCReporter.h"
+#include "platform/UserMode.h"
 #include "platform/Settings.h"
 #include "support/RunProcess.h"
 
@@ -105,13 +106,13 @@ class Bench {
  public:
   Bench() {
     Settings::SetPathOverride(dir_.File("faultbox.ini"));
-    TheApp().ResetUserMode();
+    ResetUserMode();
     if (const char* root = std::getenv("NORVIK_ROOT")) savedRoot_ = root, hadRoot_ = true;
     ::setenv("NORVIK_ROOT", dir_.File("norvik").c_str(), 1);
   }
   ~Bench() {
     Settings::SetPathOverride("");
-    TheApp().ResetUserMode();
+    ResetUserMode();
     if (hadRoot_)
       ::setenv("NORVIK_ROOT", savedRoot_.c_str(), 1);
     else

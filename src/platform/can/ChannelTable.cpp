@@ -2,10 +2,12 @@
 // board, channel) of a system's interface settings.
 #include <mutex>
 
+#include "platform/can/ChannelTable.h"
+
 #include "platform/CanAccess.h"
+#include "platform/InterfaceSettings.h"
 #include "platform/Settings.h"
 #include "platform/Text.h"
-#include "systems/QFCSystemProperty.h"
 
 namespace faultbox {
 

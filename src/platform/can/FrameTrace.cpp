@@ -8,6 +8,8 @@
 #include <string>
 #include <vector>
 
+#include "platform/can/FrameTrace.h"
+
 #include "platform/CanAccess.h"
 #include "platform/Settings.h"
 #include "platform/Text.h"
