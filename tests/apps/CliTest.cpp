@@ -6,6 +6,7 @@
 #include <sstream>
 
 #include "support/RunProcess.h"
+#include "TestPaths.h"
 
 namespace faultbox {
 namespace {
