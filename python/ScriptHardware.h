@@ -1,7 +1,7 @@
 // The hardware of the systems scripts open: the settings' channel and port
-// tables, or the built-in simulated bench of each system's pin files, chosen
-// as the command line's --hardware chooses. Every function here runs with the
-// module's lock held.
+// tables, or, when SelectHardware("sim") or FAULTBOX_HARDWARE=sim asks for
+// it, a built-in simulated bench of each system's own. Every function here
+// runs with the module's lock held.
 #pragma once
 
 #include <string>
@@ -27,7 +27,8 @@ std::vector<std::string> SimulatedRelays(const QFCSystem& system);
 // Brackets an operation that may switch relays of the system's bench: once it
 // is done, a simulated bench has acted on everything the operation sent
 // (`executed`: an execute or commit went out), so that the relays read next
-// are the ones the operation left.
+// are the ones the operation left. An operation that connected the system to
+// a simulated bench says so (warning 941).
 class BenchOperation {
  public:
   explicit BenchOperation(const QFCSystem* system);
@@ -35,6 +36,7 @@ class BenchOperation {
 
  private:
   const QFCSystem* system_;
+  bool wasConnected_;
 };
 
 }  // namespace faultbox::python

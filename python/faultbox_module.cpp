@@ -2,6 +2,8 @@
 // scripts, reported messages as Python logging records, and an orderly end
 // at the interpreter's exit.
 #include <atomic>
+#include <cstdio>
+#include <cstdlib>
 
 #include "ModuleSupport.h"
 #include "ScriptHardware.h"
@@ -54,10 +56,15 @@ class LoggingSink : public MessageSink {
 LoggingSink* g_sink = nullptr;
 std::shared_ptr<ScriptRoot>* g_root = nullptr;
 
+constexpr int kMsgResetFailed = 944;
+
 // Leaves no relay switched and no system connected, then discards the
-// documents and the simulated benches behind them.
+// documents and the simulated benches behind them. When a bench kept its
+// relays even through a reset, the interpreter ends with status 1 after
+// the message, whatever the script's own status.
 void ShutDown() {
   if (g_root == nullptr || !(*g_root)->impl) return;
+  bool mayBeSwitched = false;
   {
     py::gil_scoped_release release;
     std::lock_guard<std::recursive_mutex> lock(ModelMutex());
@@ -76,8 +83,13 @@ void ShutDown() {
           operation.Done(Succeeded(active->Deactivate()));
           VARIANT_BOOL still = VARIANT_FALSE;
           // A bench that did not take the deactivation is reset instead.
-          if (Succeeded(active->IsActivated(still)) && still != VARIANT_FALSE)
-            (void)system->ResetHardware();  // its own messages say how it went
+          if (Succeeded(active->IsActivated(still)) && still != VARIANT_FALSE &&
+              Failed(system->ResetHardware())) {
+            std::string name;
+            (void)system->get_Name(name);
+            TheReporter().ReportError(kMsgResetFailed, name);
+            mayBeSwitched = true;
+          }
         }
         VARIANT_BOOL connected = VARIANT_FALSE;
         if (Succeeded(system->IsConnected(connected)) && connected != VARIANT_FALSE)
@@ -90,6 +102,20 @@ void ShutDown() {
   if (g_sink != nullptr) {
     if (ErrorModule* module = TheReporter().Module()) module->RemoveSink(g_sink);
     g_sink->Close();
+  }
+  if (mayBeSwitched) {
+    // Python has no way to change the status once the script has ended:
+    // what the handlers still hold goes out, then the process ends.
+    try {
+      py::module_::import("logging").attr("shutdown")();
+      py::module_ sys = py::module_::import("sys");
+      for (const char* stream : {"stdout", "stderr"})
+        if (py::object file = sys.attr(stream); !file.is_none()) file.attr("flush")();
+    } catch (py::error_already_set& error) {
+      error.discard_as_unraisable("faultbox: flushing the output before the exit");
+    }
+    std::fflush(nullptr);
+    std::_Exit(1);
   }
 }
 

@@ -16,10 +16,10 @@ rm -rf "$work"
 mkdir -p "$work"
 cp "$source"/data/kr60_bench.csv "$source"/data/kr60_additional.csv "$source"/data/kr40_bench.csv "$work"/
 cd "$work"
-# Keep the user's own settings out of the demo: no CAN channel and no serial
-# port configured, so the sessions run on the simulator. Answer waits of
-# about 60 ms instead of 20 let the simulated serial bench keep up on a busy
-# machine.
+# Keep the user's own settings out of the demo; the sessions ask for the
+# simulator with --hardware sim, which is never taken otherwise. Answer
+# waits of about 60 ms instead of 20 let the simulated serial bench keep up
+# on a busy machine.
 export FAULTBOX_CONFIG="$work/settings.ini"
 printf '[Components\\Faultbox.Component]\nTimeout=3000\n' >"$FAULTBOX_CONFIG"
 
@@ -85,4 +85,5 @@ echo "pin's PinConfig entries as bits: entry 1 is state 2, entry 3 is state 8.)"
 heading "Next steps"
 echo "docs/command-line.md walks through every command; \`faultbox activate\` does one"
 echo "connect-activate-hold-deactivate run, \`faultbox shell\` reads commands from a"
-echo "terminal too, and --trace FILE records every frame or byte."
+echo "terminal too, and --trace FILE records every frame or byte. Without --hardware sim"
+echo "both drive the real bench that the settings name."

@@ -1,8 +1,11 @@
 // The hardware of a session: the settings' tables as they are, or a
-// simulated bench built from the system's pin files that the system's
-// channels or port are pointed at through the process overrides.
+// simulated bench of the system's own, built from its pin files, that the
+// system is tied to.
 #include "SimHardware.h"
 
+#include <sys/stat.h>
+
+#include <atomic>
 #include <chrono>
 #include <cstdio>
 #include <map>
@@ -14,17 +17,17 @@
 #include "platform/QFCReporter.h"
 #include "kr40/KR40Simulator.h"
 #include "kr60/KR60Simulator.h"
-#include "platform/ByteTrace.h"
 #include "platform/CanAccess.h"
 #include "platform/SerialPort.h"
 #include "platform/Settings.h"
-#include "platform/Text.h"
 #include "systems/QFCSystem.h"
 
 namespace faultbox::sim {
 namespace {
 
 constexpr int kMsgSimulatorFailed = 932;
+constexpr int kMsgHardwareMissing = 940;
+constexpr int kMsgSimulatedBench = 941;
 // The simulated serial bench needs microseconds per byte; this bound only
 // matters when it has stopped.
 constexpr std::chrono::milliseconds kSettleLimit{5000};
@@ -55,49 +58,82 @@ class ConfiguredHardware final : public Hardware {
     if (system.GetPlatformType() == fptKR60Platform) {
       const QFTCANInterfaceSettings& can = system.GetCANSettings();
       const auto target = CanChannelTable::Lookup(can.deviceType, can.firstParameter, can.secondParameter);
-      description_ = "hardware: CAN channel " + (target ? target->Text() : std::string("(none)")) +
-                     " (device type " + std::to_string(can.deviceType) + ", board " +
-                     std::to_string(can.firstParameter) + ", channel " + std::to_string(can.secondParameter) +
-                     ", from the settings " + Settings::Path() + ")";
+      const std::string channel = "device type " + std::to_string(can.deviceType) + ", board " +
+                                  std::to_string(can.firstParameter) + ", channel " +
+                                  std::to_string(can.secondParameter);
+      description_ = "hardware: CAN channel " + (target ? target->Text() : std::string("(none)")) + " (" +
+                     channel + ", from the settings " + Settings::Path() + ")";
+      if (!target) {
+        missing_ = "The CAN channel of " + channel;
+        why_ = "the channel table of the settings names no interface for it";
+      } else if (const auto driver = CanAccess::FindDriver(target->driver); !driver) {
+        missing_ = "The CAN interface " + target->Text();
+        why_ = "there is no CAN driver \"" + target->driver + "\"";
+      } else if (!driver->IsAvailable(target->interfaceName)) {
+        missing_ = "The CAN interface " + target->Text();
+        why_ = target->driver == "socketcan" ? "the kernel has no CAN interface " + target->interfaceName
+                                             : "the driver does not know it";
+      }
     } else {
       const std::string port = system.GetSerialSettings().portName;
       const std::string device = SerialPort::DevicePath(port);
       description_ = "hardware: serial port " + port + " at " + (device.empty() ? "(no device)" : device) +
                      " (from the settings " + Settings::Path() + ")";
+      struct stat info {};
+      const bool exists = !device.empty() && ::stat(device.c_str(), &info) == 0;
+      if (device.empty()) {
+        missing_ = "The serial port " + port;
+        why_ = "the port table of the settings names no device for it";
+      } else if (!exists || !S_ISCHR(info.st_mode)) {
+        missing_ = "The serial port " + port + " at " + device;
+        why_ = exists ? "it is no serial device" : "there is no such device";
+      }
     }
   }
   std::string Description() const override { return description_; }
+  bool CheckPresent() const override {
+    if (missing_.empty()) return true;
+    TheReporter().ReportError(kMsgHardwareMissing, missing_, why_);
+    return false;
+  }
 
  private:
   std::string description_;
+  std::string missing_;  // "" when everything needed is there
+  std::string why_;
 };
+
+// The warning every connect to a simulated bench gives: a script that was
+// meant for the bench must not pass unnoticed.
+void WarnSimulated(const QFCSystem& system, const std::string& bench) {
+  TheReporter().ReportWarning(kMsgSimulatedBench, system.GetName(), bench);
+}
 
 // ---- the simulated KR60 bench: the CAN driver "sim" on the system's pin file
 
 class KR60SimHardware final : public Hardware {
  public:
-  // A bus name of its own, so that nothing else in the process meets it.
-  static constexpr const char* kBench = "faultbox-shell";
+  ~KR60SimHardware() override { sim::RemoveKR60SimBench(bench_); }
 
-  ~KR60SimHardware() override {
-    CanChannelTable::SetOverride({});
-    sim::RemoveKR60SimBench(kBench);
-  }
-
-  bool Start(const QFCSystem& system) {
+  bool Start(QFCSystem& system) {
     pinFile_ = system.GetPinFilePath();
+    // A bus of its own for every system, so that nothing else in the process
+    // meets it and closing another system never touches it.
+    static std::atomic<int> benches{0};
+    bench_ = "faultbox-bench-" + std::to_string(++benches);
     if (!sim::RegisterKR60SimDriver()) return Failed("the CAN driver name \"sim\" is taken");
     sim::KR60SimulatorOptions options;
     options.pinFile = pinFile_;
     options.ecuVersion = system.GetECUVersion();
-    if (!sim::DefineKR60SimBench(kBench, options)) return Failed("the bench cannot be defined");
+    if (!sim::DefineKR60SimBench(bench_, options)) return Failed("the bench cannot be defined");
     // The bench starts when a channel first opens it; opening one here tells
     // at once when the pin file cannot make a bench.
+    const std::string target = std::string("sim:") + bench_;
     CanHandle probe = 0;
-    if (CanAccess::RegisterInterfaceTarget(std::string("sim:") + kBench, &probe) != CanResult::kOk)
+    if (CanAccess::RegisterInterfaceTarget(target, &probe) != CanResult::kOk)
       return Failed(CanAccess::LastErrorText());
     CanAccess::UnRegisterInterface(probe);
-    CanChannelTable::SetOverride({{CanChannelKey{}, CanChannelTarget{"sim", kBench}}});
+    system.SetHardwareRoute(target);
     return true;
   }
 
@@ -105,10 +141,11 @@ class KR60SimHardware final : public Hardware {
     return "hardware: simulated KR60 bench (built-in simulator) for " + pinFile_;
   }
   bool IsSimulated() const override { return true; }
+  void NoteConnected(const QFCSystem& system) const override { WarnSimulated(system, "KR60 " + bench_); }
 
   std::vector<std::string> RelayLines() const override {
     std::vector<std::string> lines;
-    const std::shared_ptr<sim::KR60Simulator> bench = sim::FindKR60SimBench(kBench);
+    const std::shared_ptr<sim::KR60Simulator> bench = sim::FindKR60SimBench(bench_);
     if (!bench) return {"the simulated bench is not running"};
     for (const auto& [id, vector] : bench->RelayVectors()) {
       const std::string relays = RelaysOn(id.type, vector);
@@ -155,6 +192,7 @@ class KR60SimHardware final : public Hardware {
   }
 
   std::string pinFile_;
+  std::string bench_;
 };
 
 // ---- the simulated KR40 or KR80 bench behind a pseudo-terminal
@@ -162,11 +200,10 @@ class KR60SimHardware final : public Hardware {
 class KR40SimHardware final : public Hardware {
  public:
   ~KR40SimHardware() override {
-    SerialPort::SetOverride({});
     if (sim_) sim_->Stop();
   }
 
-  bool Start(const QFCSystem& system) {
+  bool Start(QFCSystem& system) {
     pinFile_ = system.GetPinFilePath();
     board_ = system.GetPinFileBoardType();
     sim::KR40SimulatorOptions options;
@@ -186,7 +223,7 @@ class KR40SimHardware final : public Hardware {
       return false;
     }
     port_ = system.GetSerialSettings().portName;
-    SerialPort::SetOverride({{port_, sim_->PortPath()}});
+    system.SetHardwareRoute(sim_->PortPath());
     return true;
   }
 
@@ -196,6 +233,9 @@ class KR40SimHardware final : public Hardware {
            " at " + sim_->PortPath();
   }
   bool IsSimulated() const override { return true; }
+  void NoteConnected(const QFCSystem& system) const override {
+    WarnSimulated(system, board_ + " at " + sim_->PortPath());
+  }
 
   void BeginOperation() override { before_ = sim_->Counters(); }
   void Settle(bool executed) override {
@@ -230,16 +270,8 @@ class KR40SimHardware final : public Hardware {
 
 }  // namespace
 
-bool SettingsNameHardware() {
-  if (!CanChannelTable::Read().empty()) return true;
-  for (const auto& [key, value] : Settings::GetSection(SerialPort::kPortSection))
-    if (!EqualsNoCase(key, ByteTrace::kSettingKey) && !value.empty()) return true;
-  return false;
-}
-
 std::unique_ptr<Hardware> PrepareHardware(const std::string& choice, QFCSystem& system) {
-  const bool simulated = choice == kHardwareSim || (choice.empty() && !SettingsNameHardware());
-  if (!simulated) return std::make_unique<ConfiguredHardware>(system);
+  if (choice != kHardwareSim) return std::make_unique<ConfiguredHardware>(system);
   if (system.GetPlatformType() == fptKR60Platform) {
     auto hardware = std::make_unique<KR60SimHardware>();
     if (!hardware->Start(system)) return nullptr;

@@ -51,6 +51,7 @@ constexpr int kMsgUnknownCommand = 930;
 constexpr int kMsgCommandUsage = 931;
 constexpr int kMsgStillSwitched = 933;
 constexpr int kMsgNotSaved = 934;
+constexpr int kMsgResetFailed = 944;
 
 void Say(const std::string& line) {
   std::fflush(stderr);
@@ -183,7 +184,7 @@ class Session {
     hardware_ = PrepareHardware(options_.hardware, *system_);
     if (!hardware_) return false;
     Say(hardware_->Description());
-    return true;
+    return hardware_->CheckPresent();
   }
 
   QFCFaultboxDoc& Doc() { return *doc_; }
@@ -203,6 +204,13 @@ class Session {
       return result;
     }
     Say("connected; " + Answered("the reset"));
+    // Switching on a bench whose reset failed would add to relays that may
+    // still be on from before.
+    if (const HRESULT reset = system_->GetLastResetResult(); !Succeeded(reset)) {
+      Say("the hardware reset failed: " + ResultCodeText(reset));
+      TheReporter().ReportError(kMsgResetFailed, system_->GetName());
+      return reset;
+    }
     return result;
   }
 
@@ -218,6 +226,7 @@ class Session {
     hardware_->Settle(false);
     Say(Succeeded(result) ? "hardware reset; " + Answered("it")
                           : "the hardware reset failed: " + ResultCodeText(result));
+    if (!Succeeded(result)) TheReporter().ReportError(kMsgResetFailed, system_->GetName());
     return result;
   }
 
@@ -248,11 +257,10 @@ class Session {
     }
     hardware_->Settle(Succeeded(result) && switched);
     // The model leaves out pins that are not ready and succeeds with the
-    // rest; with none left, nothing was activated, and a script must hear so.
-    if (Succeeded(result) && on.empty()) {
+    // rest; with none left it fails and sends nothing.
+    if (result == E_FAULTBOX_ACTIVATE_FAILURE_PATTERN && on.empty() && !out.empty()) {
       Say(name + " was not activated: no pin is ready");
       SayLeftOut(out);
-      result = E_FAULTBOX;
     } else if (Succeeded(result)) {
       Say("activated " + name + ": " + PinListText(on));
       if (!out.empty()) Say("left out:");
@@ -737,9 +745,9 @@ void AddHardwareOptions(CLI::App* command, HardwareOptions& o) {
   command->add_option("DOC", o.doc, "The document")->required();
   command
       ->add_option("--hardware", o.hardware,
-                   "sim: the built-in simulated bench for the document's pin files; config: the CAN channel "
-                   "and serial port tables of the settings. Default: sim when the settings name no channel "
-                   "and no port, else config")
+                   "config (the default): the CAN channel and serial port tables of the settings, where a "
+                   "channel or port they do not name is can<n-1> or /dev/ttyS<n-1>; sim: a built-in "
+                   "simulated bench for the document's pin files, used only when asked for")
       ->check(CLI::IsMember({kHardwareSim, kHardwareConfig}));
   command->add_option("--trace", o.trace,
                       "Append every CAN frame (candump log form) or serial byte sent and received to FILE");

@@ -20,6 +20,7 @@ namespace faultbox::cli {
 namespace {
 
 constexpr int kMsgNameInUse = 87;
+constexpr int kMsgClassNotSet = 125;
 constexpr int kMsgPatternActivated = 127;
 
 }  // namespace
@@ -194,6 +195,12 @@ HRESULT ConfigurePatternPins(QFCFaultboxDoc& doc, const PatternOptions& o, std::
       return E_FAULTBOX;
     }
     done += (done.empty() ? "" : "\n") + Outcome(*pin);
+    // An entry switched on that leaves the pin without a class would be left
+    // out of every activation: refused, as a failure class choice is.
+    if (o.value == 1 && pin->GetFailureClassId() < 0) {
+      TheReporter().ReportError(kMsgClassNotSet);
+      return E_FAULTBOX_FAILURECLASS_NOT_CONFIGURATED;
+    }
   }
   others.Tell(pins, done);
   return FAULTBOX_OK;

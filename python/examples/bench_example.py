@@ -2,11 +2,12 @@
 """Inserts one failure on a HIL bench and takes it out again.
 
 Opens the bench's document, lists its failure classes, builds a pattern with
-one pin, activates it, checks the pin and deactivates. On the built-in
-simulator (the default) it also shows the relays the simulated bench switched.
+one pin, activates it, checks the pin and deactivates. It drives the hardware
+the settings name; with --hardware sim it runs on the built-in simulator
+instead and also shows the relays the simulated bench switched.
 
     PYTHONPATH=build/python NORVIK_ROOT=build/data/norvik \\
-        /usr/bin/python3 bench_example.py chassis.fsa A12 ECM 1
+        /usr/bin/python3 bench_example.py chassis.fsa A12 ECM 1 --hardware sim
 """
 
 import argparse
@@ -16,7 +17,7 @@ import sys
 import faultbox
 
 
-def run(document, pin_name, ecu_name, class_id, hardware="sim"):
+def run(document, pin_name, ecu_name, class_id, hardware):
     """Runs the example on `document`; answers the simulated bench's relays
     while the pattern was activated and after it was deactivated."""
     root = faultbox.FaultInjection()
@@ -64,7 +65,10 @@ def main():
     parser.add_argument("pin", help="the pin's name")
     parser.add_argument("ecu", help="the pin's ECU")
     parser.add_argument("class_id", type=int, help="the failure class to insert")
-    parser.add_argument("--hardware", choices=["sim", "config"], default="sim")
+    parser.add_argument(
+        "--hardware", choices=["sim", "config"], default="config",
+        help="config: the settings' CAN channel and serial port tables (default); sim: the built-in simulator",
+    )
     args = parser.parse_args()
 
     # The component's messages (message number and text) come through logging.

@@ -1,6 +1,7 @@
 """Fixtures of the faultbox module's tests: sample documents made with the
-faultbox program, the root object on the built-in simulator, and a clean
-component after every test."""
+faultbox program, the root object on the built-in simulator (asked for, as
+it never is by default), settings and benches in other processes for single
+tests, and a clean component after every test."""
 
 import os
 import pathlib
@@ -20,13 +21,22 @@ BUILD_DIR = pathlib.Path(faultbox.__file__).resolve().parents[1]
 # waits leave the simulator's thread time on a busy machine.
 _SETTINGS_DIR = tempfile.mkdtemp(prefix="faultbox-pytest-")
 SETTINGS = pathlib.Path(_SETTINGS_DIR) / "faultbox.ini"
-SETTINGS.write_text(
-    "[Components\\Faultbox.Component]\nTimeout=2500\n"
-    "[Components\\Faultbox.Component\\Hardware]\nResetCollectionWait=300\n"
-)
+
+def timeouts(collection_wait=300):
+    return (
+        "[Components\\Faultbox.Component]\nTimeout=2500\n"
+        f"[Components\\Faultbox.Component\\Hardware]\nResetCollectionWait={collection_wait}\n"
+    )
+
+
+SETTINGS.write_text(timeouts())
 os.environ["FAULTBOX_CONFIG"] = str(SETTINGS)
 os.environ.setdefault("NORVIK_ROOT", str(BUILD_DIR / "data" / "norvik"))
+# Scripts started by the tests choose the simulator themselves, or through this.
+os.environ.pop("FAULTBOX_HARDWARE", None)
 FAULTBOX_CLI = os.environ.get("FAULTBOX_CLI", str(BUILD_DIR / "apps" / "faultbox" / "faultbox"))
+FAULTBOX_SIM = str(BUILD_DIR / "apps" / "faultbox-sim" / "faultbox-sim")
+FAULTBOX_CANHUB = str(BUILD_DIR / "apps" / "faultbox-canhub" / "faultbox-canhub")
 
 # The sample benches: the files of data/ (pin file first) and the document's suffix.
 BENCHES = {
@@ -80,6 +90,39 @@ def clean_component(root):
         if system.IsConnected():
             system.Disconnect()
     root.Systems.CloseAll()
+
+
+@pytest.fixture
+def settings_with():
+    """settings_with(tables, collection_wait=300): the settings' tables (and the
+    KR60 reset's collection wait) for this test only."""
+    yield lambda tables, collection_wait=300: SETTINGS.write_text(timeouts(collection_wait) + tables)
+    SETTINGS.write_text(timeouts())
+
+
+@pytest.fixture
+def hub_bench(tmp_path):
+    """hub_bench(pin_file, *options): a KR60 bench in a faultbox-sim process
+    on a bus of its own hub; answers the bus's target "tcp:HOST:PORT/BUS"."""
+    processes = []
+
+    def start(pin_file, *options):
+        hub = subprocess.Popen([FAULTBOX_CANHUB, "--port", "0"], stdout=subprocess.PIPE, text=True)
+        processes.append(hub)
+        bus = f"127.0.0.1:{hub.stdout.readline().strip()}/script"
+        bench = subprocess.Popen(
+            [FAULTBOX_SIM, "kr60", "--pin-file", str(pin_file), "--hub", bus, *options],
+            stdout=subprocess.PIPE, text=True,
+        )
+        processes.append(bench)
+        target = bench.stdout.readline().strip()
+        assert target == "tcp:" + bus
+        return target
+
+    yield start
+    for process in reversed(processes):
+        process.terminate()
+        process.wait(timeout=60)
 
 
 def expect_failure(code, call, *args, **kwargs):

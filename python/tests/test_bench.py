@@ -5,6 +5,7 @@ several threads, and the orderly end at the interpreter's exit."""
 import importlib.util
 import logging
 import os
+import socket
 import subprocess
 import sys
 import threading
@@ -36,7 +37,7 @@ def load_example():
 )
 def test_the_guides_example(root, make_document, capsys, platform, pin, ecu, class_id, relays):
     document = make_document(platform)
-    seen = load_example().run(document, pin, ecu, class_id)
+    seen = load_example().run(document, pin, ecu, class_id, "sim")
     assert seen == {"activated": relays, "deactivated": ALL_OFF}
     out = capsys.readouterr().out
     assert "failure classes" in out and f"pin {pin} of {ecu}" in out
@@ -100,6 +101,63 @@ def test_a_pin_of_another_pattern_is_refused(kr60_bench):
     other = system.FailurePatterns.Add("Other").Pins.Add("A13", "ECM")
     expect_failure(faultbox.E_FAULTBOX_INVALID_PARAMETER, pattern.Activate, [pins[0], other])
     assert faultbox.sim_relays(system) == ALL_OFF
+
+
+def test_a_pin_without_a_class_is_not_activated(kr60_bench):
+    system, pattern, pins = kr60_bench
+    bare = pattern.Pins.Add("A13", "ECM")
+    assert bare.AdjustedFailureClass is None
+    for activate in (bare.Activate, lambda: pattern.Activate([bare])):
+        expect_failure(faultbox.E_FAULTBOX_FAILURECLASS_NOT_CONFIGURATED, activate)
+        assert faultbox.sim_relays(system) == ALL_OFF
+        assert pattern.IsActivated() is False
+
+
+@pytest.mark.parametrize("platform", ["KR60", "KR40"])
+def test_a_system_stays_on_its_simulated_bench(root, make_document, settings_with, caplog, platform):
+    """Closing one system, or opening another on other hardware, never moves
+    a system off its simulated bench onto the settings' port or bus."""
+    with socket.socket() as listener:
+        listener.bind(("127.0.0.1", 0))
+        listener.listen()
+        listener.setblocking(False)
+        watched, terminal = os.openpty()
+        try:
+            os.set_blocking(watched, False)
+            settings_with(
+                "[Components\\Faultbox.Component\\Hardware\\CAN]\n"
+                f"*,*,*=tcp:127.0.0.1:{listener.getsockname()[1]}/watched\n"
+                "[Components\\Faultbox.Component\\Hardware\\SerialPorts]\n"
+                f"COM1={os.ttyname(terminal)}\n"
+            )
+            b = root.Systems.Open(make_document(platform, "b"))
+            c = root.Systems.Open(make_document(platform, "c"))
+            c.Close()
+            root.SelectHardware("config")
+            try:
+                root.Systems.Open(make_document(platform, "a"))
+            finally:
+                root.SelectHardware("sim")
+            pin = b.FailurePatterns.Add("Stays").Pins.Add(*(("A12", "ECM") if platform == "KR60" else ("X1.1", "BCM")))
+            pin.SetFailureClass(1)
+            caplog.set_level(logging.WARNING, logger="faultbox")
+            b.Connect()
+            pin.Activate()
+            assert faultbox.sim_relays(b) != ALL_OFF
+            pin.Deactivate()
+            assert faultbox.sim_relays(b) == ALL_OFF
+            b.Disconnect()
+            # The settings' bus and port heard nothing: every byte and frame went to the bench.
+            with pytest.raises(BlockingIOError):
+                listener.accept()
+            with pytest.raises(BlockingIOError):
+                os.read(watched, 1)
+        finally:
+            os.close(watched)
+            os.close(terminal)
+    warned = [r for r in caplog.records if r.name == "faultbox" and r.number == 941]
+    assert len(warned) == 1 and warned[0].levelno == logging.WARNING
+    assert "no real relay moves" in warned[0].getMessage()
 
 
 def test_reset_of_an_activated_pattern_or_pin_is_refused(kr60_bench):
@@ -215,14 +273,35 @@ print("script ends")
 """
 
 
-def test_exit_deactivates_and_disconnects(make_document, tmp_path):
+def run_left_activated(document, tmp_path, **environment):
     script = tmp_path / "left_on.py"
     script.write_text(SCRIPT_LEFT_ACTIVATED)
-    result = subprocess.run(
-        [sys.executable, str(script), make_document("KR60")],
-        capture_output=True, text=True, env=dict(os.environ), check=False, timeout=100,
+    return subprocess.run(
+        [sys.executable, str(script), document],
+        capture_output=True, text=True, env=dict(os.environ, **environment), check=False, timeout=100,
     )
+
+
+def test_exit_deactivates_and_disconnects(make_document, tmp_path):
+    # The variable asks for the simulator, as SelectHardware("sim") does.
+    result = run_left_activated(make_document("KR60"), tmp_path, FAULTBOX_HARDWARE="sim")
     assert result.returncode == 0, result.stdout + result.stderr
-    after = result.stdout.split("script ends", 1)[1]
+    before, after = result.stdout.split("script ends", 1)
+    assert "WARNING 941: " in before and "no real relay moves" in before, result.stdout
     # Deactivated (167), then disconnected (103).
     assert 0 <= after.find("INFO 167: ") < after.find("INFO 103: "), result.stdout
+
+
+def test_exit_with_relays_that_may_still_be_switched_fails(make_document, tmp_path, settings_with, hub_bench):
+    """LOAD 0x011 (pin A12) takes the reset and the activation, then refuses
+    the deactivation and the resets after it."""
+    document = make_document("KR60")
+    target = hub_bench(tmp_path / "kr60_bench.csv", "--fault", "refuse", "--fault-module", "load:11",
+                       "--fault-after", "4")
+    # Long enough for the answers over the hub on a busy machine.
+    settings_with(f"[Components\\Faultbox.Component\\Hardware\\CAN]\n*,*,*={target}\n", collection_wait=2000)
+    result = run_left_activated(document, tmp_path)
+    assert result.returncode == 1, result.stdout + result.stderr
+    after = result.stdout.split("script ends", 1)[1]
+    assert "ERROR 942: Module LOAD 0x11 " in after, result.stdout
+    assert "ERROR 944: " in after and "may still be switched" in after, result.stdout

@@ -1,6 +1,7 @@
 // The pattern pin wrappers.
 #include "automation/QFCFailurePatternPinImpl.h"
 
+#include "automation/AutomationLookup.h"
 #include "automation/QFCFailureClassesImpl.h"
 #include "automation/QFCInterfaceProvider.h"
 #include "automation/QFCSystemImpl.h"
@@ -19,6 +20,7 @@ namespace {
 
 constexpr int kMsgActivated = 165;
 constexpr int kMsgDeactivated = 167;
+constexpr int kTextPinWithoutClass = 6740;
 
 // Pattern pins always belong to a pattern and stand for a pin; one that does
 // not cannot be used.
@@ -136,6 +138,11 @@ HRESULT QFCBaseFailurePatternPinImpl::Switch(bool activate) {
   return Call([&](QFCAbstractFailurePatternPin& pin) {
     if (!Usable(pin)) return E_FAULTBOX_NULL_POINTER;
     QFCAbstractFailurePattern& pattern = *pin.GetPattern();
+    // As the pattern's Activate with this pin: a pin without a class would
+    // be left out, and the call would succeed with nothing switched.
+    if (activate && !pin.IsActivated() && !HasConfiguredClass(pin))
+      return RaiseError(E_FAULTBOX_FAILURECLASS_NOT_CONFIGURATED,
+                        AutomationText(kTextPinWithoutClass, {pin.GetPinName(), pin.GetEcuName()}));
     pattern.SelectAllPins(false);
     pin.SetSelected(true);
     const HRESULT result = pattern.ActivatePattern(activate);

@@ -23,8 +23,9 @@ struct QFTScriptHardware {
   // tables); answers its result code.
   std::function<HRESULT(const std::string& choice)> select;
   // Runs for every system a script opens, before the script gets it (for
-  // example to give its pin file a simulated bench).
-  std::function<void(QFCSystem& system)> systemOpened;
+  // example to give its pin file a simulated bench). A failure (with its
+  // error information raised) closes the system again and fails the open.
+  std::function<HRESULT(QFCSystem& system)> systemOpened;
 };
 
 class QFCFaultInjectionImpl : public QFCOwnerProvider<QFCOpenDocuments> {

@@ -62,9 +62,16 @@ HRESULT QFCOpenDocuments::Open(const std::string& fileName, const std::string& p
     if (std::string reasons = ReasonsReportedInCall(); !reasons.empty()) description += " " + reasons;
     return RaiseError(E_FAULTBOX_FILE_IS_NOT_OPENED, std::move(description));
   }
-  system = document->GetSystem();
+  QFCSystem* opened = document->GetSystem();
+  if (const auto& prepare = QFCFaultInjectionImpl::GetScriptHardware().systemOpened) {
+    // A system without the hardware the script chose must not reach another.
+    if (const HRESULT prepared = prepare(*opened); Failed(prepared)) {
+      document->OnCloseDocument();
+      return prepared;
+    }
+  }
+  system = opened;
   documents_.push_back(std::move(document));
-  if (const auto& opened = QFCFaultInjectionImpl::GetScriptHardware().systemOpened) opened(*system);
   return FAULTBOX_OK;
 }
 

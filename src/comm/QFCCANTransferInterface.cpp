@@ -146,10 +146,15 @@ bool QFCCANTransferInterface::FindConfiguredChannel(const QFTCANInterfaceSetting
 
 bool QFCCANTransferInterface::SetUpChannel() {
   const QFTCANInterfaceSettings configured = ConfiguredChannel();
-  if (!FindConfiguredChannel(configured)) return false;
+  const QFCSystem* owner = GetOwnerSystem();
+  const std::string route = owner ? owner->GetHardwareRoute() : std::string();
+  // A system tied to its own bench never looks at the channel table.
+  if (route.empty() && !FindConfiguredChannel(configured)) return false;
 
-  CanResult result = CanAccess::RegisterInterface(configured.deviceType, configured.firstParameter,
-                                                  configured.secondParameter, &channel_);
+  CanResult result = route.empty()
+                         ? CanAccess::RegisterInterface(configured.deviceType, configured.firstParameter,
+                                                        configured.secondParameter, &channel_)
+                         : CanAccess::RegisterInterfaceTarget(route, &channel_);
   if (result != CanResult::kOk) {
     ReportLayerFailure(result);
     TheReporter().ReportError(kMsgChannelNotOpened);

@@ -59,7 +59,8 @@ HRESULT QFCSerielleTransferInterface::Connect(bool connect, std::int32_t, std::i
   if (connected_) return FAULTBOX_OK;
 
   const std::string portName = GetPortName();
-  switch (port_.Open(portName)) {
+  const QFCSystem* system = GetOwnerSystem();
+  switch (port_.Open(portName, system ? system->GetHardwareRoute() : std::string())) {
     case SerialPort::Status::kOk:
       connected_ = true;
       TheReporter().ReportInfo(kMsgConnected);

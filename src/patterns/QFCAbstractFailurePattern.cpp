@@ -2,6 +2,9 @@
 // the shared part of Reset and of a failure class choice, and the pattern record.
 #include "patterns/QFCAbstractFailurePattern.h"
 
+#include <algorithm>
+#include <vector>
+
 #include "comm/QFCAbstractTransferInterface.h"
 #include "config/QFCAbstractFailureClasses.h"
 #include "config/QFCAbstractPin.h"
@@ -35,6 +38,8 @@ constexpr int kMsgPinDeleted = 149;
 constexpr int kMsgRelayVectorIndex = 150;
 constexpr int kMsgActivating = 164;
 constexpr int kMsgDeactivating = 166;
+constexpr int kMsgResetFailed = 944;
+constexpr int kMsgNoPinReady = 945;
 
 constexpr int kPlaceNoTransferInterface = 6002;
 constexpr int kPlaceChoiceInvalidPin = 6003;
@@ -267,8 +272,8 @@ void QFCAbstractFailurePattern::ClearActivatedFlags() {
 
 void QFCAbstractFailurePattern::ResetHardwareAfterFailure() {
   if (collection_) {
-    // The reset reports its own failure; the caller returns the transfer's.
-    (void)collection_->ResetHardware();
+    if (collection_->ResetHardware() != FAULTBOX_OK)
+      TheReporter().ReportError(kMsgResetFailed, system_ ? system_->GetName() : std::string());
   } else {
     ClearActivatedFlags();
   }
@@ -315,13 +320,31 @@ HRESULT QFCAbstractFailurePattern::ActivatePattern(bool activate) {
     TheReporter().ReportError(kMsgNoPinCanBeActivated);
     return E_FAULTBOX_FAILURECLASS_NOT_CONFIGURATED;
   }
-  for (const auto& pin : pins_->GetList())
+  // The pins to switch on now; those activated before stay as they are.
+  std::vector<QFCAbstractFailurePatternPin*> switchedOn;
+  bool anySelected = false;
+  for (const auto& pin : pins_->GetList()) {
     if (pin->IsSelected() && !pin->IsReadyForActivation()) pin->SetSelected(false);
+    if (!pin->IsSelected()) continue;
+    anySelected = true;
+    if (!pin->IsActivated()) switchedOn.push_back(pin.get());
+  }
+  // Without a pin to switch, frames of the external hardware alone would
+  // still go out, and the activation would pass for one that switched.
+  if (activate && !anySelected) {
+    TheReporter().ReportError(kMsgNoPinReady, GetName());
+    return E_FAULTBOX_ACTIVATE_FAILURE_PATTERN;
+  }
 
   QFCMessageList messages;
+  const auto leftOut = [](const QFCAbstractFailurePatternPin* pin) { return !pin->IsSelected(); };
   if (!BuildMessages(messages, activate)) {
     TheReporter().ReportError(kMsgBuildFailed);
     result = E_FAULTBOX_MESSAGE_BUILD;
+  } else if (activate && !switchedOn.empty() && std::all_of(switchedOn.begin(), switchedOn.end(), leftOut)) {
+    // The builder left out every pin that was to go on (it said why).
+    TheReporter().ReportError(kMsgNoPinReady, GetName());
+    result = E_FAULTBOX_ACTIVATE_FAILURE_PATTERN;
   } else {
     result = TransferMessages(messages, activate);
     if (result == FAULTBOX_OK) {

@@ -198,6 +198,21 @@ constexpr Entry kMessages[] = {
      "Pattern %1 of %2 could not be switched off, nor the hardware reset: its relays may still be switched. "
      "Reset or switch off the bench."},
     {934, "The changes to %1 were not saved; `save` in the shell saves them."},
+    {940,
+     "%1 is not there: %2. Nothing was switched. Name the hardware in the channel or port table of the "
+     "settings, or ask for the simulated bench (--hardware sim; in Python SelectHardware(\"sim\"))."},
+    {941, "%1 is connected to a simulated bench (%2): no real relay moves."},
+    {942,
+     "Module %1 did not acknowledge the hardware reset (answer %2): it was not reset, and its relays may "
+     "still be switched."},
+    {943,
+     "No module answered the hardware reset of %1, so nothing is known of its relays. Check the CAN "
+     "channel, the bus and the power of the bench."},
+    {944,
+     "The hardware reset of %1 failed: relays may still be switched. Reset again, or switch the bench off."},
+    {945,
+     "No selected pin of failure pattern %1 is ready for activation (its module did not answer the last "
+     "reset, its ECU is disabled or it was deleted from the pin file); nothing was sent."},
 };
 
 // Numbers 6701 and 6752 are document type descriptions: newline-separated

@@ -13,7 +13,6 @@
 #include <cerrno>
 #include <cstring>
 #include <ctime>
-#include <mutex>
 
 #include "platform/ByteTrace.h"
 #include "platform/Settings.h"
@@ -36,16 +35,6 @@ timespec ToTimespec(Clock::duration duration) {
   ts.tv_sec = static_cast<time_t>(seconds.count());
   ts.tv_nsec = static_cast<long>(nanoseconds.count());
   return ts;
-}
-
-struct PortOverride {
-  std::mutex mutex;
-  std::map<std::string, std::string> paths;  // keys in upper case
-};
-
-PortOverride& TheOverride() {
-  static PortOverride* o = new PortOverride;
-  return *o;
 }
 
 }  // namespace
@@ -91,21 +80,8 @@ std::optional<int> SerialPort::PortNumber(std::string_view portName) {
   return number;
 }
 
-void SerialPort::SetOverride(std::map<std::string, std::string> paths) {
-  std::map<std::string, std::string> upper;
-  for (auto& [name, path] : paths) upper[ToUpper(name)] = std::move(path);
-  PortOverride& o = TheOverride();
-  std::lock_guard lock(o.mutex);
-  o.paths = std::move(upper);
-}
-
 std::string SerialPort::DevicePath(const std::string& portName) {
   if (portName.empty()) return {};
-  {
-    PortOverride& o = TheOverride();
-    std::lock_guard lock(o.mutex);
-    if (auto it = o.paths.find(ToUpper(portName)); it != o.paths.end()) return it->second;
-  }
   if (auto mapped = Settings::GetString(kPortSection, portName); mapped && !mapped->empty())
     // A relative path would depend on the folder the program was started in.
     return mapped->front() == '/' ? *mapped : std::string();
@@ -126,10 +102,10 @@ std::string SerialPort::DescribeLastError() const {
   return text;
 }
 
-SerialPort::Status SerialPort::OpenDevice(const std::string& portName) {
+SerialPort::Status SerialPort::OpenDevice(const std::string& portName, const std::string& devicePath) {
   Close();
   portName_ = portName;
-  devicePath_ = DevicePath(portName);
+  devicePath_ = devicePath.empty() ? DevicePath(portName) : devicePath;
   lastError_ = 0;
   if (devicePath_.empty()) return Fail(Status::kNoDevice, 0);
   // Non-blocking: a port without carrier must not hang the open, and reads
@@ -156,7 +132,7 @@ SerialPort::Status SerialPort::OpenDevice(const std::string& portName) {
 
 bool SerialPort::CanOpen(const std::string& portName) {
   SerialPort port;
-  if (port.OpenDevice(portName) != Status::kOk) return false;
+  if (port.OpenDevice(portName, {}) != Status::kOk) return false;
   // Nothing of the port's state was touched; nothing to purge.
   ::ioctl(port.fd_, TIOCNXCL);
   ::close(port.fd_);
@@ -164,10 +140,10 @@ bool SerialPort::CanOpen(const std::string& portName) {
   return true;
 }
 
-SerialPort::Status SerialPort::Open(const std::string& portName) {
+SerialPort::Status SerialPort::Open(const std::string& portName, const std::string& devicePath) {
   Close();
   trace_ = ByteTrace::FromSettings();
-  if (Status status = OpenDevice(portName); status != Status::kOk) {
+  if (Status status = OpenDevice(portName, devicePath); status != Status::kOk) {
     trace_.reset();
     return status;
   }

@@ -7,7 +7,6 @@
 #include <chrono>
 #include <cstddef>
 #include <cstdint>
-#include <map>
 #include <memory>
 #include <optional>
 #include <string>
@@ -45,21 +44,17 @@ class SerialPort {
 
   // n of "COMn" (any case, n decimal); nothing for other names.
   static std::optional<int> PortNumber(std::string_view portName);
-  // The device path of a port: the process override's entry for the name,
-  // then the settings' entry, else /dev/ttyS<n-1> for "COMn" with n >= 1; ""
-  // when there is none.
+  // The device path of a port: the settings' entry for the name, else
+  // /dev/ttyS<n-1> for "COMn" with n >= 1; "" when there is none.
   static std::string DevicePath(const std::string& portName);
-  // Port name to device path for this process only, consulted before the
-  // settings (used to put a system's port on a simulated bench); names are
-  // compared without regard to case. An empty map removes the override.
-  static void SetOverride(std::map<std::string, std::string> paths);
   // Whether the port could be opened now; it is closed again at once.
   static bool CanOpen(const std::string& portName);
 
   // Opens the port exclusively, purges both directions, applies the line
   // settings and raises DTR, then RTS. On failure the port stays closed and
-  // the status tells which step failed.
-  Status Open(const std::string& portName);
+  // the status tells which step failed. A `devicePath` given is opened
+  // instead of the one the tables name for the port.
+  Status Open(const std::string& portName, const std::string& devicePath = {});
   // Drops the unread input and closes; closing a closed port does nothing.
   void Close();
   bool IsOpen() const { return fd_ >= 0; }
@@ -90,7 +85,7 @@ class SerialPort {
   // Waits until the output queue is empty or the deadline has passed.
   Status Drain(std::chrono::steady_clock::time_point deadline);
   // Opens the device path of the name exclusively, without settings.
-  Status OpenDevice(const std::string& portName);
+  Status OpenDevice(const std::string& portName, const std::string& devicePath);
 
   int fd_ = -1;
   std::string portName_;

@@ -7,6 +7,7 @@
 #include <memory>
 #include <string>
 #include <string_view>
+#include <utility>
 #include <vector>
 
 #include "systems/QFCSystemProperty.h"
@@ -91,8 +92,20 @@ class QFCSystem : public QFCSystemProperty {
   [[nodiscard]] HRESULT SetConnection(bool connect, bool report);
   // Sends the reset messages to all modules, learns which modules answer and
   // marks every pattern deactivated. Modules that stay silent are reported but
-  // do not fail the reset.
+  // do not fail the reset. A module that answers without acknowledging was
+  // not reset: it is named, the reset fails and the patterns keep their
+  // activated pins, since their relays may still be switched.
   [[nodiscard]] HRESULT ResetHardware();
+  // The result of the last ResetHardware, also of the one a connect runs.
+  [[nodiscard]] HRESULT GetLastResetResult() const { return lastResetResult_; }
+  // The hardware this system is tied to instead of what the settings' tables
+  // name for its interface settings: a CAN channel target "driver:interface"
+  // (KR60) or a serial device path (KR40 family); "" for the tables. A front
+  // end that gives the system a bench of its own sets it once after the
+  // open; it then holds whatever the interface settings become, so that no
+  // change elsewhere moves the system to other hardware.
+  void SetHardwareRoute(std::string route) { hardwareRoute_ = std::move(route); }
+  const std::string& GetHardwareRoute() const { return hardwareRoute_; }
   // A pin is available when its module answered the last reset.
   void UpdatePinAvailability();
   // The administration asked for other systems on the same HIL simulator; a
@@ -171,7 +184,7 @@ class QFCSystem : public QFCSystemProperty {
   // Not connected, no responding module, every pin unavailable.
   void EnterDisconnectedState();
   // The platform parts of ResetHardware; `completed` is false when a send
-  // failed and the reset ended early.
+  // failed and the reset ended early, or a module did not acknowledge it.
   [[nodiscard]] HRESULT ResetKR60Hardware(bool& completed);
   [[nodiscard]] HRESULT ResetKR40Hardware(bool& completed);
 
@@ -184,6 +197,8 @@ class QFCSystem : public QFCSystemProperty {
   std::unique_ptr<QFCFailurePatterns> patterns_;
   std::unique_ptr<QFCFailurePatternNode> rootFolder_;
   const QFCSystemAdmin* admin_ = nullptr;
+  HRESULT lastResetResult_ = FAULTBOX_OK;
+  std::string hardwareRoute_;
 };
 
 }  // namespace faultbox

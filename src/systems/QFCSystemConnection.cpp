@@ -3,6 +3,7 @@
 #include <chrono>
 #include <cstdio>
 #include <limits>
+#include <set>
 #include <thread>
 
 #include "comm/QFCCANTransferInterface.h"
@@ -30,6 +31,8 @@ constexpr int kMsgFiuLoadSilent = 113;
 constexpr int kMsgNotConnected = 120;
 constexpr int kMsgOtherSystemOnSameHil = 145;
 constexpr int kMsgRsimLoadSilent = 162;
+constexpr int kMsgResetNotAcknowledged = 942;
+constexpr int kMsgNoModuleAnswered = 943;
 
 // Places named by internal faults of this file.
 constexpr int kPlaceInterfaceNotOfPlatform = 5010;
@@ -62,6 +65,36 @@ std::string HexAddress(std::uint32_t address) {
   char text[16];
   std::snprintf(text, sizeof text, "0x%x", address);
   return text;
+}
+
+// Enters every module of the system that answered the reset into
+// `answered`, and into `reset` those that acknowledged it. Any other answer
+// (a refusal, or one that cannot be read) means the module kept its relays:
+// it is named, and the result is E_FAIL for a refusal, else
+// E_FAULTBOX_RECEIVE_MESSAGE.
+[[nodiscard]] HRESULT TakeResetAnswers(const QFCCANReceivedMap& received, std::uint32_t offset,
+                         std::set<std::uint16_t>& answered, std::set<std::uint16_t>& reset) {
+  HRESULT result = FAULTBOX_OK;
+  for (const auto& [identifier, message] : received) {
+    if (!IsAnswerOfOwnModule(identifier, offset) || message == nullptr) continue;
+    const auto address = static_cast<std::uint16_t>(identifier & QFCCANMessage::kAddressMask);
+    answered.insert(address);
+    const QFCCANMessage::AnswerStatus status = message->EvaluateAnswer();
+    if (status == QFCCANMessage::AnswerStatus::kAccepted) {
+      reset.insert(address);
+      continue;
+    }
+    char data[24];
+    std::snprintf(data, sizeof data, "0x%016llX", static_cast<unsigned long long>(message->GetData()));
+    const char* type = (identifier & QFCCANMessage::kTypeCodeMask) == QFCCANMessage::kTypeCodeFIU    ? "FIU "
+                       : (identifier & QFCCANMessage::kTypeCodeMask) == QFCCANMessage::kTypeCodeRSIM ? "RSIM "
+                       : (identifier & QFCCANMessage::kTypeCodeMask) == QFCCANMessage::kTypeCodeLOAD ? "LOAD "
+                                                                                                     : "";
+    TheReporter().ReportError(kMsgResetNotAcknowledged, type + HexAddress(address), data);
+    if (result == FAULTBOX_OK || status == QFCCANMessage::AnswerStatus::kRefused)
+      result = status == QFCCANMessage::AnswerStatus::kRefused ? E_FAIL : E_FAULTBOX_RECEIVE_MESSAGE;
+  }
+  return result;
 }
 
 }  // namespace
@@ -144,7 +177,7 @@ void QFCSystem::UpdatePinAvailability() {
 
 HRESULT QFCSystem::ResetHardware() {
   respondingModules_.clear();
-  if (!connected_) return E_FAULTBOX_NOT_CONNECTED_TO_HARDWARE;
+  if (!connected_) return lastResetResult_ = E_FAULTBOX_NOT_CONNECTED_TO_HARDWARE;
   bool completed = false;
   HRESULT result = FAULTBOX_OK;
   if (platformType_ == fptKR60Platform) {
@@ -153,13 +186,14 @@ HRESULT QFCSystem::ResetHardware() {
     result = ResetKR40Hardware(completed);
   } else {
     TheReporter().ReportError(kMsgUnsupportedPlatform, std::to_string(platformType_));
-    return E_FAULTBOX_BOARD_TYPE_IS_NOT_SUPORTED;
+    return lastResetResult_ = E_FAULTBOX_BOARD_TYPE_IS_NOT_SUPORTED;
   }
   if (completed) {
     // The relays are all off: no pattern holds the hardware any more.
     patterns_->ClearActivatedFlags();
     TheReporter().ReportInfo(kMsgResetFinished);
   }
+  lastResetResult_ = result;
   // The map was emptied even when a send failed: the pins must not claim
   // modules that nobody has heard since.
   UpdatePinAvailability();
@@ -194,10 +228,10 @@ HRESULT QFCSystem::ResetKR60Hardware(bool& completed) {
   std::this_thread::sleep_for(std::chrono::milliseconds(GetResetCollectionWait()));
   QFCCANReceivedMap received;
   HRESULT result = can->Receive(received);
+  HRESULT acknowledged = FAULTBOX_OK;
+  std::set<std::uint16_t> answered;
   if (result == FAULTBOX_OK) {
-    for (const auto& [identifier, message] : received)
-      if (IsAnswerOfOwnModule(identifier, offset))
-        respondingModules_.insert(static_cast<std::uint16_t>(identifier & QFCCANMessage::kAddressMask));
+    acknowledged = TakeResetAnswers(received, offset, answered, respondingModules_);
     received.clear();
 
     const QFCAbstractHardwareInfo* info = hardwareInfos_.empty() ? nullptr : hardwareInfos_.front().get();
@@ -218,14 +252,19 @@ HRESULT QFCSystem::ResetKR60Hardware(bool& completed) {
           TheReporter().ReportInternalFault(kPlaceLoadAddressUnreadable);
           break;
         }
+        // One that answered without acknowledging was named already.
         if (address > std::numeric_limits<std::uint16_t>::max() ||
-            respondingModules_.count(static_cast<std::uint16_t>(address)) == 0)
+            answered.count(static_cast<std::uint16_t>(address)) == 0)
           TheReporter().ReportError(module.message, HexAddress(address));
       }
     }
   }
-  completed = true;
-  return result;
+  // A bench that is off, or another bus, looks the same: a reset that
+  // nobody heard must not pass for one that switched everything off.
+  if (answered.empty()) TheReporter().ReportWarning(kMsgNoModuleAnswered, GetName());
+  // A module that kept its relays leaves the patterns as they are.
+  completed = acknowledged == FAULTBOX_OK;
+  return acknowledged != FAULTBOX_OK ? acknowledged : result;
 }
 
 HRESULT QFCSystem::ResetKR40Hardware(bool& completed) {

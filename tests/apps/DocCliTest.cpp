@@ -154,6 +154,12 @@ TEST_F(DocCliTest, RefusalsLeaveTheDocumentAsItWas) {
   // A pin that the pattern holds cannot take a class its pin file line does not name.
   Ok({"pattern", "add-pins", doc, "A", "--pin", "DCU_FL", "X1.3"});
   Refused({"pattern", "set-class", doc, "A", "--pin", "DCU_FL", "X1.3", "1"}, doc, "error 130");
+  // Entries 0 and 1 of X1.1 make class 2; with entry 2 too no class fits, and
+  // a pin without a class would never be activated.
+  Ok({"pattern", "add-pins", doc, "A", "--pin", "BCM", "X1.1"});
+  for (const char* entry : {"0", "1"})
+    Ok({"pattern", "config", doc, "A", "--pin", "BCM", "X1.1", entry, "1"});
+  Refused({"pattern", "config", doc, "A", "--pin", "BCM", "X1.1", "2", "1"}, doc, "error 125");
 
   // A write-protected document refuses every change and stays as it is.
   ASSERT_EQ(::chmod(doc.c_str(), 0444), 0);

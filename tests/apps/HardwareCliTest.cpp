@@ -77,14 +77,20 @@ const BenchCase kBenches[] = {
 class HardwareCli : public ::testing::Test {
  protected:
   void SetUp() override {
-    // Empty channel and port tables: the simulator is the default. A short
+    // Channel and port tables that lead nowhere: a run that does not ask for
+    // the simulator must never reach a port or bus of the machine. A short
     // collection wait keeps the KR60 resets quick; the serial answer waits
     // (100 ms rather than 20) give the simulator's thread time on a busy
     // machine, at the price of a slow KR40 reset (125 silent addresses).
-    settings_ = dir_.Write("faultbox.ini",
-                           "[Components\\Faultbox.Component]\nTimeout=5000\n"
-                           "[Components\\Faultbox.Component\\Hardware]\nResetCollectionWait=300\n");
+    settings_ = dir_.Write("faultbox.ini", std::string(kTimeouts) + kNowhere);
   }
+
+  static constexpr const char* kTimeouts =
+      "[Components\\Faultbox.Component]\nTimeout=5000\n"
+      "[Components\\Faultbox.Component\\Hardware]\nResetCollectionWait=300\n";
+  static constexpr const char* kNowhere =
+      "[Components\\Faultbox.Component\\Hardware\\CAN]\n*,*,*=socketcan:nowhere0\n"
+      "[Components\\Faultbox.Component\\Hardware\\SerialPorts]\nCOM1=/nonexistent/tty\n";
 
   ProcessResult Run(const std::vector<std::string>& args, const std::string& input = {}) {
     return RunFaultbox(args, input,
@@ -190,7 +196,7 @@ TEST_P(HardwareCliTest, ShellKeepsThePatternActivatedBetweenCommands) {
   const BenchCase& c = GetParam();
   const std::string doc = MakeDocument(c);
   const std::string trace = dir_.File("trace.log");
-  const ProcessResult r = Run({"shell", doc, "--trace", trace},
+  const ProcessResult r = Run({"shell", doc, "--hardware", "sim", "--trace", trace},
                               "connect\n"
                               "activate Test\n"
                               "status\n"
@@ -199,7 +205,6 @@ TEST_P(HardwareCliTest, ShellKeepsThePatternActivatedBetweenCommands) {
                               "relays\n"
                               "disconnect\n");
   ASSERT_EQ(r.exitCode, 0) << r.out << r.err;
-  // Without --hardware and without channels or ports in the settings: the simulator.
   EXPECT_EQ(r.out.rfind("hardware: simulated ", 0), 0u) << r.out;
   // Each command is echoed, as the input is no terminal.
   EXPECT_NE(r.out.find("> activate Test\nactivated Test: "), std::string::npos) << r.out;
@@ -318,7 +323,7 @@ TEST_F(HardwareCliRefusals, AMissingPatternIsRefusedBeforeTheHardwareIsTouched) 
 }
 
 // Pins that are not ready (here: their ECU is disabled) are left out; when
-// none is left, nothing was activated and the command fails.
+// none is left, nothing at all is sent and the command fails.
 TEST_F(HardwareCliRefusals, PinsThatAreNotReadyAreLeftOut) {
   const std::string doc = Document();
   const struct {
@@ -332,47 +337,132 @@ TEST_F(HardwareCliRefusals, PinsThatAreNotReadyAreLeftOut) {
        "activated Test: TCU 7\nleft out:\n  ECM K12: ECU ECM is disabled.\n",
        {"FIU 0x21: relay 1 (state 3) on"}},
       {"TCU", 1,
-       "Test was not activated: no pin is ready\n  ECM K12: ECU ECM is disabled.\n  TCU 7: ECU TCU is disabled.\n",
+       "Test was not activated: no pin is ready\n  ECM K12: ECU ECM is disabled.\n  TCU 7: ECU TCU is "
+       "disabled.\n",
        kAllOff},
   };
   for (const auto& c : cases) {
     SCOPED_TRACE(c.disable);
     Ok({"ecu", "disable", doc, c.disable});
-    const ProcessResult r = Run({"activate", doc, "Test", "--hold", "0"});
+    const ProcessResult r = Run({"activate", doc, "Test", "--hold", "0", "--hardware", "sim"});
     EXPECT_EQ(r.exitCode, c.exitCode) << r.out << r.err;
     EXPECT_NE(r.out.find(c.told), std::string::npos) << r.out;
+    EXPECT_EQ(r.err.find("error 945") != std::string::npos, c.exitCode != 0) << r.err;
     EXPECT_EQ(RelaysShown(r.out, c.exitCode == 0 ? "after activation" : "now"), c.relays) << r.out;
     EXPECT_NE(r.out.find("\ndisconnected\n"), std::string::npos) << r.out;
   }
+
+  // On KR60 a pattern whose external hardware is in use (class 2 wires the
+  // resistor) would still have RSIM and FIU frames to send without any pin.
+  const std::string chassis = MakeDocument(kBenches[0]);
+  const std::string trace = dir_.File("nothing.trace");
+  Ok({"pattern", "set-class", chassis, "Test", "--pin", "ECM", "A12", "2", "0"});
+  for (const char* ecu : {"ECM", "ABS_ESP"}) Ok({"ecu", "disable", chassis, ecu});
+  const ProcessResult r =
+      Run({"activate", chassis, "Test", "--hold", "0", "--hardware", "sim", "--trace", trace});
+  EXPECT_EQ(r.exitCode, 1) << r.out << r.err;
+  EXPECT_NE(r.err.find("error 945"), std::string::npos) << r.err;
+  // Only the reset of connecting went out: no relay frame, no commit.
+  const std::string traced = ReadText(trace);
+  EXPECT_NE(traced.find("#81"), std::string::npos) << traced;
+  EXPECT_EQ(traced.find("#82"), std::string::npos) << traced;
 }
 
-// The settings decide the default: a serial port in the port table means
-// the real line, which a missing device fails to connect.
-TEST_F(HardwareCliRefusals, SettingsWithAPortMakeTheRealHardwareTheDefault) {
+// Without --hardware the settings' hardware is driven, with the defaults for
+// what they do not name, and never the simulator: an interface that is not
+// there stops the command before anything is switched.
+TEST_F(HardwareCliRefusals, WithoutHardwareSimTheSettingsHardwareIsDriven) {
   const std::string doc = Document();
+  const std::string chassis = MakeDocument(kBenches[0]);
+  const std::string empty = dir_.Write("empty.ini", kTimeouts);
   const struct {
+    std::string doc;
     const char* hardware;
+    std::string settings;
     const char* firstLine;
-    int exitCode;
+    const char* missing;  // named by message 940; "" when the run works
   } cases[] = {
-      {"", "hardware: serial port COM1 at /nonexistent/tty", 1},
-      {"config", "hardware: serial port COM1 at /nonexistent/tty", 1},
-      {"sim", "hardware: simulated KR80 bench", 0},
+      {doc, "", settings_, "hardware: serial port COM1 at /nonexistent/tty", "COM1 at /nonexistent/tty"},
+      {doc, "config", settings_, "hardware: serial port COM1 at /nonexistent/tty",
+       "COM1 at /nonexistent/tty"},
+      {chassis, "", settings_, "hardware: CAN channel socketcan:nowhere0", "socketcan:nowhere0"},
+      // Without a table: board 1, channel 1 is the kernel's can0.
+      {chassis, "", empty, "hardware: CAN channel socketcan:can0", "socketcan:can0"},
+      {doc, "sim", settings_, "hardware: simulated KR80 bench", ""},
   };
-  std::filesystem::remove(settings_);
-  settings_ = dir_.Write("ports.ini",
-                         "[Components\\Faultbox.Component\\Hardware\\SerialPorts]\n"
-                         "COM1=/nonexistent/tty\n");
+  const bool haveCan0 = std::filesystem::exists("/sys/class/net/can0");
   for (const auto& c : cases) {
-    SCOPED_TRACE(c.hardware);
-    std::vector<std::string> args = {"activate", doc, "Test", "--hold", "0"};
+    SCOPED_TRACE(c.firstLine);
+    if (std::string(c.missing) == "socketcan:can0" && haveCan0) continue;  // a real bus: not to be touched
+    std::vector<std::string> args = {"activate", c.doc, "Test", "--hold", "0"};
     if (*c.hardware != '\0') args.insert(args.end(), {"--hardware", c.hardware});
-    const ProcessResult r = Run(args);
-    EXPECT_EQ(r.exitCode, c.exitCode) << r.out << r.err;
+    const ProcessResult r = RunFaultbox(
+        args, {}, {"NORVIK_ROOT=" FAULTBOX_BINARY_DIR "/data/norvik", "FAULTBOX_CONFIG=" + c.settings});
     EXPECT_EQ(r.out.rfind(c.firstLine, 0), 0u) << r.out;
-    if (c.exitCode != 0) {
-      EXPECT_NE(r.out.find("not connected"), std::string::npos) << r.out;
+    if (*c.missing == '\0') {
+      EXPECT_EQ(r.exitCode, 0) << r.out << r.err;
+      continue;
     }
+    EXPECT_EQ(r.exitCode, 1) << r.out << r.err;
+    const std::size_t told = r.err.find("error 940: ");
+    ASSERT_NE(told, std::string::npos) << r.err;
+    const std::string line = r.err.substr(told, r.err.find('\n', told) - told);
+    EXPECT_NE(line.find(c.missing), std::string::npos) << line;
+    EXPECT_NE(line.find("--hardware sim"), std::string::npos) << line;
+    EXPECT_EQ(r.out.find("connected"), std::string::npos) << r.out;
+  }
+}
+
+// A module that does not acknowledge the reset was not reset, on the bench
+// of another process over the hub: the command says that relays may still be
+// switched and fails, whichever reset it was.
+TEST_F(HardwareCliRefusals, AResetThatIsNotAcknowledgedFailsTheCommand) {
+  const std::string doc = MakeDocument(kBenches[0]);
+  const struct {
+    const char* name;
+    std::vector<std::string> fault;  // faultbox-sim's options
+    std::vector<const char*> told;
+    bool activated;
+  } cases[] = {
+      // The reset of connecting: nothing is activated.
+      {"refused at connecting",
+       {"--fault", "refuse", "--fault-module", "load:11"},
+       {"error 942: Module LOAD 0x11 ", "error 944"},
+       false},
+      // LOAD 0x11 takes the reset and the activation, then refuses the
+      // deactivation and every reset after it: the pattern stays activated.
+      {"refused at the end",
+       {"--fault", "refuse", "--fault-module", "load:11", "--fault-after", "4"},
+       {"error 942: Module LOAD 0x11 ", "error 944", "error 933"},
+       true},
+      {"nobody answers", {"--fault", "silent"}, {"warning 943", "error 944"}, false},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.name);
+    test::BackgroundProcess hub({FAULTBOX_CANHUB_PATH, "--port", "0"});
+    const std::string port = hub.ReadLine();
+    ASSERT_FALSE(port.empty()) << "the hub did not start";
+    const std::string bus = "127.0.0.1:" + port + "/refusing";
+    std::vector<std::string> argv = {FAULTBOX_SIM_PATH,           "kr60",  "--pin-file",
+                                     dir_.File("kr60_bench.csv"), "--hub", bus};
+    argv.insert(argv.end(), c.fault.begin(), c.fault.end());
+    test::BackgroundProcess bench(argv);
+    ASSERT_EQ(bench.ReadLine(), "tcp:" + bus);
+    // Long enough for the answers over the hub on a busy machine.
+    const std::string settings =
+        dir_.Write("hub.ini",
+                   "[Components\\Faultbox.Component]\nTimeout=5000\n"
+                   "[Components\\Faultbox.Component\\Hardware]\nResetCollectionWait=2000\n"
+                   "[Components\\Faultbox.Component\\Hardware\\CAN]\n*,*,*=tcp:" +
+                       bus + "\n");
+    const ProcessResult r =
+        RunFaultbox({"activate", doc, "Test", "--hold", "0"}, {},
+                    {"NORVIK_ROOT=" FAULTBOX_BINARY_DIR "/data/norvik", "FAULTBOX_CONFIG=" + settings});
+    EXPECT_EQ(r.exitCode, 1) << r.out << r.err;
+    for (const char* told : c.told) EXPECT_NE(r.err.find(told), std::string::npos) << told << "\n" << r.err;
+    EXPECT_NE(r.err.find("may still be switched"), std::string::npos) << r.err;
+    EXPECT_EQ(r.out.find("activated Test: ") != std::string::npos, c.activated) << r.out;
+    EXPECT_EQ(bench.Stop(SIGTERM), 0);
   }
 }
 

@@ -402,6 +402,20 @@ TEST(KR40Choice, VectorWithoutOnPositionsOnlyClearsPinConfig) {
   EXPECT_EQ(pin->GetFailureClassId(), 1);  // no interlock run: the class stays
 }
 
+// A KR80 board takes classes 1 to 3 only: the interlock leaves a pin
+// without a class after a choice of class 4, and the choice fails.
+TEST(KR40Choice, AChoiceTheInterlockLeavesWithoutAClassFails) {
+  PatternBench bench({{"P1", "Engine", "1,4"}}, "KR80");
+  bench.AddClass(1, {"10000"});
+  bench.AddClass(4, {"00010"});
+  auto* pattern = bench.CreateWith({bench.Pin("Engine", "P1")});
+  auto* pin = pattern->GetPinAt(0);
+  MessageCapture cap;
+  EXPECT_EQ(pattern->SetFailureClass(pin, 4, 0), E_FAULTBOX_FAILURECLASS_NOT_CONFIGURATED);
+  EXPECT_EQ(cap.Numbers(), std::vector<int>{125});
+  EXPECT_EQ(pin->GetFailureClassId(), -1);
+}
+
 TEST(KR40Pin, PinConfigValuesAndModuleData) {
   PatternBench bench({{"P1", "Engine", "1", "7F", "10"}});
   bench.AddClass(1, {"00000"});

@@ -24,7 +24,8 @@ const std::vector<int> kRaisedMessages = {
     // the front ends' own
     901, 902, 910, 911, 912,
     920, 921, 922, 923,
-    930, 931, 932, 933, 934};
+    930, 931, 932, 933, 934,
+    940, 941, 942, 943, 944, 945};
 
 // Every resource string the component loads by number.
 const std::vector<int> kUsedStrings = {6701, 6704, 6706, 6707, 6709, 6711, 6712, 6713, 6714, 6715, 6716, 6717,

@@ -257,13 +257,16 @@ struct KR60ResetCase {
   HRESULT result;
   Modules responding;
   std::set<std::string> available;
-  std::map<int, std::string> reported;  // message -> first text
+  std::map<int, std::string> reported;  // message -> first text ("" for the system's name)
+  // Modules that refuse the reset once the pattern of both pins is activated.
+  std::vector<KR60ModuleId> refusing = {};
 };
 
 class KR60Reset : public KR60Connection, public ::testing::WithParamInterface<KR60ResetCase> {};
 
 // Silent modules are named and their pins become unavailable; the reset
-// itself succeeds as long as any answer came.
+// itself succeeds as long as any answer came. A module that refuses it was
+// not reset: the reset fails and the activated pattern stays activated.
 TEST_P(KR60Reset, LearnsWhichModulesAnswer) {
   const KR60ResetCase& c = GetParam();
   const std::string path = bench_.Write("kr60.csv", KR60Pins("0_0_3", c.offset));
@@ -273,20 +276,30 @@ TEST_P(KR60Reset, LearnsWhichModulesAnswer) {
   QFCSystem* system = Open(path);
   ASSERT_NE(system, nullptr);
   ASSERT_EQ(system->SetConnection(true, true), FAULTBOX_OK);
+  QFCAbstractFailurePattern* pattern = nullptr;
+  if (!c.refusing.empty()) {
+    ASSERT_NE(pattern = MakePattern(*system), nullptr);
+    ASSERT_EQ(pattern->ActivatePattern(true), FAULTBOX_OK);
+    for (const KR60ModuleId& id : c.refusing) ASSERT_TRUE(Sim()->SetFaultMode(id, {KR60FaultMode::kRefuse}));
+  }
 
   MessageCapture cap;
   EXPECT_EQ(system->ResetHardware(), c.result);
+  EXPECT_EQ(system->GetLastResetResult(), c.result);
   EXPECT_TRUE(system->IsConnected());
   EXPECT_EQ(system->GetRespondingModules(), c.responding);
   EXPECT_EQ(AvailablePins(*system), c.available);
-  for (int number : {113, 162}) {
+  for (int number : {113, 162, 942, 943}) {
     const auto expected = c.reported.find(number);
     ASSERT_EQ(cap.Count(number), expected == c.reported.end() ? 0 : 1) << number;
     if (expected != c.reported.end()) {
-      EXPECT_EQ(cap.Find(number)->first, expected->second);
+      EXPECT_EQ(cap.Find(number)->first, expected->second.empty() ? system->GetName() : expected->second);
     }
   }
-  EXPECT_EQ(cap.Count(110), 1);
+  EXPECT_EQ(cap.Count(110), c.refusing.empty() ? 1 : 0);
+  if (pattern != nullptr) {
+    EXPECT_TRUE(pattern->IsAnyPinActivated());
+  }
   // Every pin left out is named.
   EXPECT_EQ(cap.Count(109), 2 - static_cast<int>(c.available.size()));
 }
@@ -300,7 +313,10 @@ const KR60ResetCase kKR60ResetCases[] = {
     {"SilentRsim", {kRsim}, "10", std::nullopt, FAULTBOX_OK, {0x003, 0x012, 0x013}, kBothPins, {{162, "0x4"}}},
     {"SilentLoadModule", {kLoad13}, "10", std::nullopt, FAULTBOX_OK, {0x003, 0x004, 0x012}, {"Engine/P1"}, {}},
     // Without any answer the load modules are not looked at.
-    {"NothingAnswers", {kFiu, kRsim, kLoad12, kLoad13}, "10", std::nullopt, E_FAULTBOX_TIME_OUT, {}, {}, {}},
+    {"NothingAnswers", {kFiu, kRsim, kLoad12, kLoad13}, "10", std::nullopt, E_FAULTBOX_TIME_OUT, {}, {}, {{943, ""}}},
+    {"RefusingLoadModule", {}, "10", std::nullopt, E_FAIL, {0x003, 0x004, 0x012}, {"Engine/P1"}, {{942, "LOAD 0x13"}}, {kLoad13}},
+    // It answered: not named as silent too.
+    {"RefusingFiu", {}, "10", std::nullopt, E_FAIL, {0x004, 0x012, 0x013}, kBothPins, {{942, "FIU 0x3"}}, {kFiu}},
     // The reset still goes out, under offset 0.
     {"UnreadableOffsetCountsAsZero", {}, "none", 0u, FAULTBOX_OK, {0x003, 0x004, 0x012, 0x013}, kBothPins, {}},
 };

@@ -17,6 +17,7 @@ namespace faultbox {
 namespace {
 
 constexpr int kMsgTimeOut = 69;
+constexpr int kMsgClassNotSet = 125;
 constexpr int kMsgNotAnswered = 174;
 
 constexpr int kPlaceNoBuilder = 6611;
@@ -97,6 +98,14 @@ HRESULT QFCKR40FailurePattern::SetFailureClass(QFCAbstractFailurePatternPin* pin
   // interlock, which judges the entries switched so far.
   for (int position = 0; position < QFCAbstractFailurePatternPin::kPinConfigEntries; ++position)
     if ((mask >> position) & 1u) pin->SetPinConfig(position, QFCAbstractFailurePatternPin::kEntryOn, false);
+  // The interlock may judge the entries otherwise than the class does; a pin
+  // it leaves without a class would be left out of every activation.
+  std::int32_t id = -1;
+  std::int32_t index = -1;
+  if (pin->GetAdjustedFailureClass(id, index) == nullptr) {
+    TheReporter().ReportError(kMsgClassNotSet);
+    return E_FAULTBOX_FAILURECLASS_NOT_CONFIGURATED;
+  }
   return FAULTBOX_OK;
 }
 
