@@ -22,6 +22,9 @@ class QFITransferOwner {
   virtual bool IsReadOnly() const = 0;
   // Keeps the values the CAN layer reported for the configured channel.
   virtual bool SetCANSettings(const QFTCANInterfaceSettings* settings) = 0;
+  // The bench the system is tied to instead of what the settings' tables
+  // name: a CAN channel target or a serial device path; "" for the tables.
+  virtual const std::string& GetHardwareRoute() const = 0;
 
  protected:
   ~QFITransferOwner() = default;

@@ -146,7 +146,7 @@ bool QFCCANTransferInterface::FindConfiguredChannel(const QFTCANInterfaceSetting
 
 bool QFCCANTransferInterface::SetUpChannel() {
   const QFTCANInterfaceSettings configured = ConfiguredChannel();
-  const QFCSystem* owner = GetOwnerSystem();
+  const QFITransferOwner* owner = GetOwnerSystem();
   const std::string route = owner ? owner->GetHardwareRoute() : std::string();
   // A system tied to its own bench never looks at the channel table.
   if (route.empty() && !FindConfiguredChannel(configured)) return false;

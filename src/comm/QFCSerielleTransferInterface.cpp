@@ -59,7 +59,7 @@ HRESULT QFCSerielleTransferInterface::Connect(bool connect, std::int32_t, std::i
   if (connected_) return FAULTBOX_OK;
 
   const std::string portName = GetPortName();
-  const QFCSystem* system = GetOwnerSystem();
+  const QFITransferOwner* system = GetOwnerSystem();
   switch (port_.Open(portName, system ? system->GetHardwareRoute() : std::string())) {
     case SerialPort::Status::kOk:
       connected_ = true;

@@ -105,7 +105,7 @@ class QFCSystem : public QFCSystemProperty {
   // open; it then holds whatever the interface settings become, so that no
   // change elsewhere moves the system to other hardware.
   void SetHardwareRoute(std::string route) { hardwareRoute_ = std::move(route); }
-  const std::string& GetHardwareRoute() const { return hardwareRoute_; }
+  const std::string& GetHardwareRoute() const override { return hardwareRoute_; }
   // A pin is available when its module answered the last reset.
   void UpdatePinAvailability();
   // The administration asked for other systems on the same HIL simulator; a
