@@ -15,9 +15,9 @@ FUZZ_SECONDS ?= 20
 
 PACKAGES = cmake ninja-build g++ make libgtest-dev libgmock-dev libbenchmark-dev ccache \
            libcli11-dev nlohmann-json3-dev clang libclang-rt-dev \
-           pybind11-dev python3-dev python3-pytest
+           pybind11-dev python3-dev python3-pytest mypy
 
-.PHONY: all deps configure build demo test check test-asan fuzz clean
+.PHONY: all deps configure build install demo test check test-asan fuzz clean
 
 all: build
 
@@ -31,6 +31,11 @@ configure: deps $(BUILD)/build.ninja
 
 build: configure
 	cmake --build $(BUILD) -j $(JOBS)
+
+# Installs the Python package faultbox where Debian's python3 finds it
+# (below /usr/local), or below PREFIX: `make install PREFIX=/opt/faultbox`.
+install: build
+	cmake --install $(BUILD) $(if $(PREFIX),--prefix $(PREFIX))
 
 demo: build
 	@scripts/demo.sh $(BUILD)

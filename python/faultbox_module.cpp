@@ -1,11 +1,12 @@
-// The Python module `faultbox`: the automation object model for test
-// scripts, reported messages as Python logging records, and an orderly end
-// at the interpreter's exit.
+// The compiled part of the Python package `faultbox`: the automation object
+// model for test scripts, reported messages as Python logging records (and
+// with the failure of the call that reported them), and an orderly end at
+// the interpreter's exit. faultbox/__init__.py adds what is plain Python.
 #include <atomic>
 #include <cstdio>
 #include <cstdlib>
 
-#include "ModuleSupport.h"
+#include "BindModel.h"
 #include "ScriptHardware.h"
 #include "automation/QFCFailurePatternImpl.h"
 #include "automation/QFCFailurePatternsImpl.h"
@@ -25,6 +26,7 @@ constexpr const char* kLoggerName = "faultbox";
 class LoggingSink : public MessageSink {
  public:
   void Display(const ErrorRecord& record, bool show) override {
+    NoteReportedMessage(record);
     if (closed_.load()) return;
     py::gil_scoped_acquire gil;
     try {
@@ -142,19 +144,27 @@ std::shared_ptr<ScriptRoot> FaultInjection() {
 
 }  // namespace faultbox::python
 
-PYBIND11_MODULE(faultbox, m) {
+PYBIND11_MODULE(_faultbox, m) {
   using namespace faultbox;
   using namespace faultbox::python;
   m.doc() =
-      "Failure insertion on HIL test benches from Python: the automation object model.\n\n"
-      "faultbox.FaultInjection() gives the root object; docs/python.md is the guide.";
+      "The compiled part of the package faultbox: the automation object model. Import faultbox, not this "
+      "module.";
+  m.attr("__version__") = FAULTBOX_VERSION_TEXT;
   py::module_::import("logging");
 
+  // The classes are the package's: their names, reprs and help pages say
+  // faultbox.System, which is where scripts find them.
+  const py::object ownName = m.attr("__name__");
+  m.attr("__name__") = "faultbox";
   AddErrorsAndConstants(m);
   AddModelClasses(m);
+  m.attr("__name__") = ownName;
 
   m.def("FaultInjection", &FaultInjection,
         "The root object. The first call starts the component; every call gives the same object.");
+  m.def(
+      "_started", [] { return g_root != nullptr; }, "True once FaultInjection() started the component.");
 
   m.def(
       "sim_relays",

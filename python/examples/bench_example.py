@@ -7,24 +7,26 @@ the settings name; with --hardware sim it runs on the built-in simulator
 instead and also shows the relays the simulated bench switched.
 
     PYTHONPATH=build/python NORVIK_ROOT=build/data/norvik \\
-        /usr/bin/python3 bench_example.py chassis.fsa A12 ECM 1 --hardware sim
+        /usr/bin/python3 bench_example.py chassis.fsa ECM A12 1 --hardware sim
 """
 
 import argparse
 import logging
 import sys
+from typing import Dict, List
 
 import faultbox
 
 
-def run(document, pin_name, ecu_name, class_id, hardware):
+def run(document: str, ecu_name: str, pin_name: str, class_id: int, hardware: str) -> Dict[str, List[str]]:
     """Runs the example on `document`; answers the simulated bench's relays
     while the pattern was activated and after it was deactivated."""
     root = faultbox.FaultInjection()
     root.SelectHardware(hardware)  # extension: "sim" or "config"
-    system = root.Systems.Open(document)
-    relays = {}
-    try:
+    relays: Dict[str, List[str]] = {}
+    # The block closes the system at its end, deactivating and disconnecting
+    # first, also when a step fails or Ctrl-C stops the script.
+    with root.Systems.Open(document) as system:
         print(f"{system.Name}: {system.PlatformType.name}, pin file {system.PinFile}")
 
         classes = system.FailureClasses
@@ -34,36 +36,28 @@ def run(document, pin_name, ecu_name, class_id, hardware):
 
         # A pattern of one pin (both calls are extensions of the model).
         pattern = system.FailurePatterns.Add("Script example")
-        pin = pattern.Pins.Add(pin_name, ecu_name)
+        pin = pattern.Pins.Add((ecu_name, pin_name))
         pin.SetFailureClass(class_id)
-        failure_class = pin.AdjustedFailureClass
-        print(f"pin {pin.Name} of {pin.EcuName}: class {failure_class.ID} ({failure_class.Name})")
+        chosen = pin.AdjustedFailureClass
+        assert chosen is not None
+        print(f"pin {pin.Name} of {pin.EcuName}: class {chosen.ID} ({chosen.Name})")
 
-        system.Connect()
-        try:
-            pattern.Activate()
+        with system.connected(), pattern.activated():
             if not pin.IsActivated():
                 raise RuntimeError(f"pin {pin.Name} of {pin.EcuName} is not activated")
             relays["activated"] = faultbox.sim_relays(system)  # extension
             print("activated; relays:", "; ".join(relays["activated"]) or "(real hardware)")
             # ... the test on the bench runs here ...
-        finally:
-            pattern.Deactivate()
         print("deactivated; pin activated:", pin.IsActivated())
         relays["deactivated"] = faultbox.sim_relays(system)
-        system.Disconnect()
-    finally:
-        # Refused while a pattern is still activated; the module then
-        # deactivates and disconnects at the interpreter's exit.
-        system.Close()
     return relays
 
 
-def main():
-    parser = argparse.ArgumentParser(description=__doc__.splitlines()[0])
+def main() -> int:
+    parser = argparse.ArgumentParser(description=(__doc__ or "").splitlines()[0])
     parser.add_argument("document", help="the bench's document (.fsa or .fss)")
-    parser.add_argument("pin", help="the pin's name")
     parser.add_argument("ecu", help="the pin's ECU")
+    parser.add_argument("pin", help="the pin's name")
     parser.add_argument("class_id", type=int, help="the failure class to insert")
     parser.add_argument(
         "--hardware", choices=["sim", "config"], default="config",
@@ -74,9 +68,11 @@ def main():
     # The component's messages (message number and text) come through logging.
     logging.basicConfig(level=logging.INFO, format="%(levelname)s %(name)s %(message)s")
     try:
-        run(args.document, args.pin, args.ecu, args.class_id, args.hardware)
+        run(args.document, args.ecu, args.pin, args.class_id, args.hardware)
     except faultbox.FaultboxError as error:
-        print(f"failed: {error.description} ({getattr(error.hresult, 'name', hex(error.hresult))})")
+        print(f"failed: {error}")
+        for message in error.messages:
+            print(f"  {message}")
         return 1
     return 0
 

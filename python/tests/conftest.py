@@ -14,7 +14,7 @@ import pytest
 import faultbox
 
 SOURCE_DIR = pathlib.Path(os.environ.get("FAULTBOX_SOURCE_DIR", pathlib.Path(__file__).resolve().parents[2]))
-BUILD_DIR = pathlib.Path(faultbox.__file__).resolve().parents[1]
+BUILD_DIR = pathlib.Path(os.environ.get("FAULTBOX_BUILD_DIR", pathlib.Path(faultbox.__file__).resolve().parents[2]))
 
 # Without a settings file of their own the tests would read the user's.
 # A short collection wait keeps the KR60 resets quick; the serial answer
@@ -83,13 +83,9 @@ def root():
 def clean_component(root):
     """Every test leaves no pattern activated, no system connected or open."""
     yield
-    for system in list(root.Systems):
-        active = system.FailurePatterns.ActivatedFailurePattern
-        if active is not None:
-            active.Deactivate()
-        if system.IsConnected():
-            system.Disconnect()
-    root.Systems.CloseAll()
+    for system in root.Systems:
+        with system:  # deactivates, disconnects and closes
+            pass
 
 
 @pytest.fixture

@@ -37,7 +37,7 @@ def load_example():
 )
 def test_the_guides_example(root, make_document, capsys, platform, pin, ecu, class_id, relays):
     document = make_document(platform)
-    seen = load_example().run(document, pin, ecu, class_id, "sim")
+    seen = load_example().run(document, ecu, pin, class_id, "sim")
     assert seen == {"activated": relays, "deactivated": ALL_OFF}
     out = capsys.readouterr().out
     assert "failure classes" in out and f"pin {pin} of {ecu}" in out
