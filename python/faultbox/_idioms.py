@@ -92,7 +92,7 @@ def _contains(self: Any, key: object) -> bool:
 # ---- switching off ---------------------------------------------------------
 
 
-def switch_off(system: Any) -> Optional[str]:
+def switch_off(system: _model.System) -> Optional[str]:
     """Makes sure no pattern of `system` stays activated: deactivates the
     activated one and, when that fails, resets the hardware (every relay
     off). Answers the name of the pattern that was activated, or None.
@@ -100,12 +100,12 @@ def switch_off(system: Any) -> Optional[str]:
     pattern = system.FailurePatterns.ActivatedFailurePattern
     if pattern is None:
         return None
-    name: str = pattern.Name
+    name = pattern.Name
     _deactivate(pattern, system)
     return name
 
 
-def _deactivate(pattern: Any, system: Any) -> None:
+def _deactivate(pattern: _model._BaseFailurePattern, system: _model.System) -> None:
     """Deactivates `pattern` of `system` when it is activated, resetting the
     hardware when that fails."""
     if not pattern.IsActivated():
