@@ -149,6 +149,7 @@ def _leave(system: Any, pending: Optional[BaseException], close: bool) -> None:
 
 
 def _enter_system(self: Any) -> Any:
+    """``with system:`` gives the system itself."""
     return self
 
 
