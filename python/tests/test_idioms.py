@@ -15,8 +15,6 @@ import pytest
 
 import faultbox
 
-SETTINGS = pathlib.Path(os.environ["FAULTBOX_CONFIG"])  # conftest's
-
 ALL_OFF = ["all relays off"]
 A12_ON = "LOAD 0x011: channel 1 relay 2 on"
 ABS_ON = "LOAD 0x013: channel 1 relay 2 on"
@@ -139,19 +137,13 @@ def test_pins_are_added_and_removed_in_both_orders(bench: faultbox.System) -> No
 
 
 @pytest.fixture
-def silent_port() -> Iterator[int]:
+def silent_port(settings_with: Callable[[str], None]) -> Iterator[int]:
     """COM9 of the settings: a pseudo-terminal nobody answers on."""
     controller, device = pty.openpty()
-    saved = SETTINGS.read_text()
-    SETTINGS.write_text(
-        saved + "[Components\\Faultbox.Component\\Hardware\\SerialPorts]\nCOM9=%s\n" % os.ttyname(device)
-    )
-    try:
-        yield 9
-    finally:
-        SETTINGS.write_text(saved)
-        os.close(controller)
-        os.close(device)
+    settings_with("[Components\\Faultbox.Component\\Hardware\\SerialPorts]\nCOM9=%s\n" % os.ttyname(device))
+    yield 9
+    os.close(controller)
+    os.close(device)
 
 
 def _timeout(root: faultbox._FaultInjection, document: str, port: int) -> None:
