@@ -12,8 +12,8 @@
 #include "automation/QFCFailurePatternsImpl.h"
 #include "automation/QFCSystemImpl.h"
 #include "automation/QFCSystemsImpl.h"
-#include "platform/QFCReporter.h"
 #include "platform/ErrorModule.h"
+#include "platform/QFCReporter.h"
 
 namespace faultbox::python {
 
