@@ -56,7 +56,7 @@ test-asan: deps
 	  ctest --test-dir $(ASAN_BUILD) --output-on-failure -j $(JOBS)
 
 fuzz: deps
-	cmake -S . -B $(FUZZ_BUILD) -G Ninja -DFAULTBOX_FUZZ=ON -DFAULTBOX_TESTS=OFF -DFAULTBOX_BENCH=OFF \
+	cmake -S . -B $(FUZZ_BUILD) -G Ninja -DFAULTBOX_FUZZ=ON -DFAULTBOX_TESTS=OFF -DFAULTBOX_BENCH=OFF -DFAULTBOX_PYTHON=OFF \
 	  -DCMAKE_CXX_COMPILER=clang++ -DCMAKE_BUILD_TYPE=RelWithDebInfo
 	cmake --build $(FUZZ_BUILD) -j $(JOBS)
 	@scripts/run-fuzzers.sh $(FUZZ_BUILD) $(FUZZ_SECONDS)
